@@ -13,5 +13,5 @@ function(tessik_add_module name)
     ${PROJECT_SOURCE_DIR}/src
     ${PROJECT_SOURCE_DIR}/include
     ${PROJECT_BINARY_DIR}/include)
-  target_link_libraries(${name} PRIVATE tessik::warnings)
+  target_link_libraries(${name} PRIVATE tessik::warnings PUBLIC tessik::sanitizers)
 endfunction()

@@ -39,7 +39,9 @@ struct TESSIK_API Point3 {
   /// This vector scaled to unit length; the zero vector stays zero (never NaN).
   Point3 Normalize() const;
   /// The cross product, this vector first.
-  Point3 CrossProd(const Point3& o) const { return {y * o.z - z * o.y, z * o.x - x * o.z, x * o.y - y * o.x}; }
+  Point3 CrossProd(const Point3& o) const {
+    return {y * o.z - z * o.y, z * o.x - x * o.z, x * o.y - y * o.x};
+  }
 };
 
 inline float DotProd(const Point3& a, const Point3& b) { return a.x * b.x + a.y * b.y + a.z * b.z; }

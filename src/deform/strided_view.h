@@ -24,7 +24,9 @@ struct StridedView {
   StridedView(const void* pointer, std::uint32_t byteStride)
       : base(static_cast<const unsigned char*>(pointer)), stride(byteStride) {}
 
-  const unsigned char* at(int j) const { return base + static_cast<std::uint32_t>(static_cast<std::uint32_t>(j) * stride); }
+  const unsigned char* at(int j) const {
+    return base + static_cast<std::uint32_t>(static_cast<std::uint32_t>(j) * stride);
+  }
   T operator[](int j) const { return loadUnaligned<T>(at(j)); }
 };
 
