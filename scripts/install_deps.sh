@@ -5,7 +5,7 @@ set -euo pipefail
 
 packages=(
   cmake g++ make clang-format
-  libtbb-dev libglew-dev
+  libtbb-dev libglm-dev libglew-dev
   libegl-dev libgl-dev libegl-mesa0 libgl1-mesa-dri
   libgtest-dev libbenchmark-dev
 )
