@@ -15,6 +15,8 @@ bool near(float a, float b) { return std::fabs(a - b) <= 1e-5f; }
 
 }  // namespace
 
+int checkBindingInputs();
+
 int main() {
   TessikSDK::Corvane::CCorvane engine;
   engine.SetNumBones(1);
@@ -48,5 +50,5 @@ int main() {
     std::fprintf(stderr, "bad point index threw something else: %s\n", e.what());
     return 1;
   }
-  return 0;
+  return checkBindingInputs();
 }

@@ -1,0 +1,34 @@
+#pragma once
+
+#include "tessik/geombind.h"
+
+#include "geombind/sparse_vertex_weights.h"
+
+namespace TessikSDK::GeomBind {
+
+/// Clamps a falloff to [0, 1]: first the larger of 0 and the value, then the smaller of 1 and that. A NaN
+/// falloff comes out as 0.
+float clampFalloff(float falloff);
+
+class ContextImpl : public IContext {
+ public:
+  ~ContextImpl() override;
+
+  void reserved() override;
+  ISparseVertexWeights* bindGeodesicSparseVoxel(IMesh* mesh,
+                                                ITransformHierarchy* hierarchy,
+                                                IProgress* progress,
+                                                float falloff,
+                                                unsigned int influenceLimit,
+                                                int resolution,
+                                                bool refineInterior) override;
+  ISparseVertexWeights* bindHeatmap(IMesh* mesh,
+                                    ITransformHierarchy* hierarchy,
+                                    IProgress* progress,
+                                    float falloff,
+                                    unsigned int influenceLimit) override;
+
+  SparseVertexWeightsImpl result;
+};
+
+}  // namespace TessikSDK::GeomBind

@@ -1,0 +1,50 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <map>
+#include <utility>
+#include <vector>
+
+#include "tessik/geombind.h"
+
+#include "geombind/collision/primitives.h"
+
+namespace TessikSDK::GeomBind {
+
+struct VertexRecord {
+  std::array<float, 3> normal{0.0f, 0.0f, 0.0f};
+  std::array<float, 3> position{0.0f, 0.0f, 0.0f};
+};
+
+using TriangleRecord = std::array<std::uint32_t, 3>;
+using DirectedEdge = std::pair<std::uint32_t, std::uint32_t>;
+
+/// The mesh as both binding methods read it: what the host added, plus the tables and the unit-frame
+/// normalisation that preparation derives from it.
+struct MeshData {
+  Collision::AABB boundingBox;
+  std::vector<VertexRecord> vertices;
+  std::vector<TriangleRecord> triangles;
+  /// Every directed edge (a, b) of every triangle in winding order, once, ascending.
+  std::vector<DirectedEdge> edges;
+  /// For a directed edge, the third vertex of the (last) triangle that has it.
+  std::map<DirectedEdge, std::uint32_t> edgeOpposite;
+  /// Per vertex: the vertices sharing an edge with it, distinct and ascending.
+  std::vector<std::vector<std::uint32_t>> vertexNeighbours;
+  /// Per vertex: the triangles using it, distinct and ascending.
+  std::vector<std::vector<std::uint32_t>> vertexTriangles;
+  std::array<float, 3> normalizeOffset{0.0f, 0.0f, 0.0f};
+  float normalizeScale = 1.0f;
+};
+
+class MeshImpl : public IMesh {
+ public:
+  void addVertex(float x, float y, float z) override;
+  void addTriangle(unsigned int a, unsigned int b, unsigned int c) override;
+  ~MeshImpl() override;
+
+  MeshData data;
+};
+
+}  // namespace TessikSDK::GeomBind
