@@ -223,7 +223,7 @@ void BM_MapPoint(benchmark::State& state) {
   const int n = s.numPoints;
   for (auto _ : state) {
     for (int i = 0; i < n; ++i) engine.MapPoint(i, in + 3 * i, out + 3 * i);
-    benchmark::DoNotOptimize(out);
+    benchmark::DoNotOptimize(static_cast<const float*>(out));
     benchmark::ClobberMemory();
   }
   state.SetItemsProcessed(state.iterations() * n);
@@ -239,7 +239,7 @@ void BM_PlainBlendLoop(benchmark::State& state) {
   float* o = out.data();
   for (auto _ : state) {
     PlainBlend(s, o);
-    benchmark::DoNotOptimize(o);
+    benchmark::DoNotOptimize(static_cast<const float*>(o));
     benchmark::ClobberMemory();
   }
   state.SetItemsProcessed(state.iterations() * s.numPoints);
