@@ -1,0 +1,18 @@
+# Writes OUTPUT, a C++ source defining one `const char* const` per shader file, holding the file's text
+# byte for byte. Run as: cmake -DOUTPUT=<file.cpp> -DNAMESPACE=<ns> -DSHADERS="Name=path;..." -P EmbedShaders.cmake
+set(body "// Generated from the .glsl files beside the voxelizer; edit those instead.\n")
+string(APPEND body "#include \"geombind/gpu/shader_sources.h\"\n\nnamespace ${NAMESPACE} {\n\n")
+foreach(entry IN LISTS SHADERS)
+  string(REPLACE "=" ";" pair "${entry}")
+  list(GET pair 0 name)
+  list(GET pair 1 path)
+  file(READ "${path}" text)
+  if(text MATCHES "\\)glsl\"")
+    message(FATAL_ERROR "${path} contains the raw-string delimiter")
+  endif()
+  string(APPEND body "const char* const ${name} = R\"glsl(${text})glsl\";\n\n")
+endforeach()
+string(APPEND body "}  // namespace ${NAMESPACE}\n")
+file(WRITE "${OUTPUT}.tmp" "${body}")
+file(COPY_FILE "${OUTPUT}.tmp" "${OUTPUT}" ONLY_IF_DIFFERENT)
+file(REMOVE "${OUTPUT}.tmp")
