@@ -94,6 +94,29 @@ inline TriMesh torus(const Vec3& c, float R, float r, int segments, int sides, b
   return m;
 }
 
+// Capped cylinder along +x from x0 to x1 around the line (y, z) = (cy, cz): `rings` sections along the
+// axis, `segments` around it.
+inline TriMesh cylinderX(float x0, float x1, float cy, float cz, float r, int rings, int segments) {
+  TriMesh m;
+  const double pi = 3.14159265358979323846;
+  for (int i = 0; i <= rings; ++i) {
+    const float x = x0 + (x1 - x0) * static_cast<float>(i) / static_cast<float>(rings);
+    for (int j = 0; j < segments; ++j) {
+      const double a = 2 * pi * j / segments;
+      m.add(x, cy + static_cast<float>(r * std::cos(a)), cz + static_cast<float>(r * std::sin(a)));
+    }
+  }
+  auto at = [&](int i, int j) { return static_cast<std::uint32_t>(i * segments + (j % segments)); };
+  for (int i = 0; i < rings; ++i)
+    for (int j = 0; j < segments; ++j) quad(m, at(i, j), at(i, j + 1), at(i + 1, j + 1), at(i + 1, j));
+  const std::uint32_t start = m.add(x0, cy, cz), end = m.add(x1, cy, cz);
+  for (int j = 0; j < segments; ++j) {
+    m.triangles.push_back({start, at(0, j + 1), at(0, j)});
+    m.triangles.push_back({end, at(rings, j), at(rings, j + 1)});
+  }
+  return m;
+}
+
 // The L-shaped prism: the polygon (0,0) (2,0) (2,1) (1,1) (1,2) (0,2), scaled by `s`, from z0 to z1.
 inline TriMesh lShape(const Vec3& origin, float s, float z0, float z1) {
   const float poly[6][2] = {{0, 0}, {2, 0}, {2, 1}, {1, 1}, {1, 2}, {0, 2}};
