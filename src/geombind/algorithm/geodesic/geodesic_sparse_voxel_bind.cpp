@@ -20,8 +20,8 @@ namespace {
 // Blend of each smoothing pass toward the neighbours' average.
 constexpr float kSmoothingBlend = 0.7f;
 
-// Stage "Compute Octree": the mesh triangles and the bone elements, split down to the finest depth.
-// Returns without building when cancelled.
+}  // namespace
+
 void computeOctree(IProgress& progress,
                    const MeshData& mesh,
                    const HierarchyData& hierarchy,
@@ -60,8 +60,6 @@ void computeOctree(IProgress& progress,
   progress.update(elementCount);
   progress.end();
 }
-
-}  // namespace
 
 std::int32_t ceilLog2(std::int32_t n) {
   if (n <= 1) return 0;

@@ -3,6 +3,7 @@
 #include <cstdint>
 
 #include "geombind/algorithm/bind_strategy.h"
+#include "geombind/collision/octree.h"
 
 namespace TessikSDK::GeomBind::Algorithm {
 
@@ -23,6 +24,14 @@ struct GeodesicSparseVoxelOptions : IBindOptions {
   float boundaryCostFactor = 4.0f;
   std::int32_t smoothingIterations = 4;
 };
+
+/// Stage "Compute Octree": the mesh triangles and the bone elements (segments parent to child, points at
+/// joints without children) split down to depth ceilLog2(resolution). Left unbuilt when cancelled.
+void computeOctree(IProgress& progress,
+                   const MeshData& mesh,
+                   const HierarchyData& hierarchy,
+                   std::int32_t resolution,
+                   Collision::Octree& octree);
 
 /// Weight exponent for a falloff in [0, 1], in single precision: 5 at 0, 17.5 at 0.5, 30 at 1.
 double weightExponent(const GeodesicSparseVoxelOptions& options);
