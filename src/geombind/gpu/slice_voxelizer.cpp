@@ -4,9 +4,8 @@
 #include <cmath>
 #include <cstring>
 
-#include <omp.h>
-
 #include "geombind/gpu/shader_sources.h"
+#include "geombind/parallel.h"
 
 namespace TessikSDK::GeomBind::Gpu {
 
@@ -14,9 +13,6 @@ namespace {
 
 using Mat4 = std::array<float, 16>;
 using Vec3 = std::array<float, 3>;
-
-// Every loop runs on one worker per processor, whatever the host set for its own OpenMP regions.
-int workerCount() { return omp_get_num_procs(); }
 
 double secondsSince(std::chrono::steady_clock::time_point start) {
   return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
@@ -230,7 +226,7 @@ void SliceVoxelizer::flushSlices(const SweepMapping& mapping, AxisVoteGrid& vote
   std::uint8_t* grid = votes.votes.data();
   const std::uint32_t* slices = sliceIndices;
   // Each texel and bit maps to its own voxel, so the rows can be unpacked side by side.
-#pragma omp parallel for schedule(static) num_threads(workerCount())
+#pragma omp parallel for schedule(static) num_threads(processorThreads())
   for (std::int64_t v = 0; v < height; ++v) {
     for (std::int64_t u = 0; u < width; ++u) {
       const std::uint8_t* t = texels + (v * width + u) * 4;
@@ -310,7 +306,7 @@ void classifyVotes(IProgress& progress,
                    std::vector<std::uint32_t>& ambiguous) {
   const std::int64_t count = static_cast<std::int64_t>(grid.cellCount());
   const std::uint8_t* bytes = votes.votes.data();
-#pragma omp parallel for schedule(static) num_threads(workerCount())
+#pragma omp parallel for schedule(static) num_threads(processorThreads())
   for (std::int64_t i = 0; i < count; ++i) {
     if (progress.isCanceled()) continue;
     const auto index = static_cast<std::uint64_t>(i);
@@ -338,7 +334,7 @@ void refineByWindingNumber(IProgress& progress,
   const glm::dvec3 d(extent.x / nx, extent.y / ny, extent.z / grid.dims[2]);
   const glm::dvec3 c0 = mesh.boundingBox.lower + d * 0.5;
   const std::int64_t count = static_cast<std::int64_t>(ambiguous.size());
-#pragma omp parallel for schedule(static) num_threads(workerCount())
+#pragma omp parallel for schedule(static) num_threads(processorThreads())
   for (std::int64_t j = 0; j < count; ++j) {
     if (progress.isCanceled()) continue;
     const std::uint32_t i = ambiguous[static_cast<std::size_t>(j)];
