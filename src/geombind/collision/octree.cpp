@@ -13,7 +13,18 @@ namespace {
 
 bool touches(const AABB& box, const glm::dvec3& point) { return contains(box, point); }
 bool touches(const AABB& box, const Segment& segment) { return intersects(box, segment); }
-bool touches(const AABB& box, const Triangle& triangle) { return intersects(box, triangle); }
+bool touches(const AABB& box, const Triangle& triangle) {
+  // Most children of a split miss a given triangle on a box axis. That axis test, done first with exactly
+  // the arithmetic of the full overlap test, rejects them cheaply; the answer cannot differ, since the
+  // full test is the conjunction of its axis tests.
+  const glm::dvec3 centre = (box.lower + box.upper) * 0.5;
+  const glm::dvec3 half = (box.upper - box.lower) * 0.5;
+  for (int k = 0; k < 3; ++k) {
+    const double q0 = triangle.a[k] - centre[k], q1 = triangle.b[k] - centre[k], q2 = triangle.c[k] - centre[k];
+    if (std::min({q0, q1, q2}) > half[k] || std::max({q0, q1, q2}) < -half[k]) return false;
+  }
+  return triangleBoxOverlap(centre, half, triangle);
+}
 
 }  // namespace
 
@@ -32,32 +43,54 @@ Octant::Octant(const AABB& box, std::uint8_t depth) : bounds(box), depth(depth) 
 
 Octant::~Octant() = default;
 
+void Octant::deleteChildren() {
+  children.clear();
+  childBlock.reset();
+}
+
 void Octant::split() {
+  childBlock.reset(new Octant[8]);
   children.reserve(8);
   const glm::dvec3 c = (bounds.lower + bounds.upper) * 0.5;
   for (int i = 0; i < 8; ++i) {
-    AABB box;
+    Octant& child = childBlock[i];
     for (int k = 0; k < 3; ++k) {
       // Neighbouring children share the exact centre value, so the closed tests agree on faces.
       const bool upperHalf = ((i >> k) & 1) != 0;
-      box.lower[k] = upperHalf ? c[k] : bounds.lower[k];
-      box.upper[k] = upperHalf ? bounds.upper[k] : c[k];
+      child.bounds.lower[k] = upperHalf ? c[k] : bounds.lower[k];
+      child.bounds.upper[k] = upperHalf ? bounds.upper[k] : c[k];
     }
-    children.push_back(std::make_unique<Octant>(box, static_cast<std::uint8_t>(depth + 1)));
+    child.bounds.inflateFlatAxes();
+    child.depth = static_cast<std::uint8_t>(depth + 1);
+    children.push_back(&child);
   }
 }
 
 void Octant::subdivide(std::uint32_t minDepth, std::uint32_t depthLimit) {
   if (depth >= depthLimit) return;
   split();
-  for (const auto& child : children) {
-    for (IOctreeElement* element : elements) {
-      if (element->intersects(child->bounds)) child->elements.push_back(element);
+  // Each element meets each child box once; the answers are kept so every child list is allocated at
+  // its final size, in element order.
+  std::vector<std::uint8_t> touched(elements.size(), 0);
+  std::size_t counts[8] = {};
+  for (std::size_t e = 0; e < elements.size(); ++e) {
+    for (int i = 0; i < 8; ++i) {
+      if (elements[e]->intersects(children[i]->bounds)) {
+        touched[e] = static_cast<std::uint8_t>(touched[e] | (1u << i));
+        ++counts[i];
+      }
     }
   }
-  elements.clear();
-  elements.shrink_to_fit();
-  for (const auto& child : children) {
+  for (int i = 0; i < 8; ++i) {
+    std::vector<IOctreeElement*>& list = children[i]->elements;
+    list.reserve(counts[i]);
+    for (std::size_t e = 0; e < elements.size(); ++e) {
+      if ((touched[e] >> i) & 1u) list.push_back(elements[e]);
+    }
+  }
+  std::vector<std::uint8_t>().swap(touched);
+  std::vector<IOctreeElement*>().swap(elements);
+  for (Octant* child : children) {
     if (child->elements.empty() && child->depth >= minDepth) continue;
     child->subdivide(minDepth, depthLimit);
   }
@@ -84,12 +117,12 @@ void Octree::insert(IOctreeElement* element) {
 void Octree::build(std::uint32_t minDepth, std::uint32_t depthLimit) {
   // Octant depths are 8-bit; deeper limits could never be reached and would wrap the child depth.
   constexpr std::uint32_t kDeepest = 255;
-  children.clear();
+  deleteChildren();
   subdivide(std::min(minDepth, kDeepest), std::min(depthLimit, kDeepest));
 }
 
 void Octree::clear() {
-  children.clear();
+  deleteChildren();
   elements.clear();
   allElements.clear();
 }

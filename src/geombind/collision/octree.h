@@ -42,7 +42,7 @@ class IOctreeConstVisitor {
 
 /// One node: a closed box, its depth (0 at the root) and either no children or exactly eight, child i
 /// taking the upper half of the box on x when bit 0 of i is set, on y for bit 1, on z for bit 2.
-/// Octants own their children but not the elements they list.
+/// Octants own their children (allocated together, as one block of eight) but not the elements they list.
 class Octant {
  public:
   /// Copies `bounds` and pads its flat axes, so a flat mesh still gives leaves with volume.
@@ -56,16 +56,22 @@ class Octant {
 
   AABB bounds;
   std::uint8_t depth;
-  std::vector<std::unique_ptr<Octant>> children;
+  std::vector<Octant*> children;  ///< empty, or the eight octants of childBlock in child order
   std::vector<IOctreeElement*> elements;
 
  protected:
   /// Splits octants that hold elements until `depthLimit`, and empty ones until `minDepth`. Elements
   /// move to every child whose closed box they touch; after this only leaves list elements.
   void subdivide(std::uint32_t minDepth, std::uint32_t depthLimit);
+  /// Deletes every child (recursively).
+  void deleteChildren();
 
  private:
+  Octant() : depth(0) {}  // for the child blocks; split() sets the box and depth
   void split();
+
+  // Deep trees hold millions of octants: one allocation per eight children instead of eight.
+  std::unique_ptr<Octant[]> childBlock;
 };
 
 /// The root octant. It owns every element inserted since the last clear; element pointers stay valid
