@@ -7,7 +7,7 @@ packages=(
   cmake g++ make clang-format
   libtbb-dev libglm-dev libglew-dev
   libegl-dev libgl-dev libegl-mesa0 libgl1-mesa-dri
-  libgtest-dev libbenchmark-dev
+  libgtest-dev libbenchmark-dev libeigen3-dev
 )
 
 missing=()

@@ -1,0 +1,40 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <utility>
+#include <vector>
+
+// Sparse Cholesky factorisation of symmetric positive-definite systems. Depends on nothing else in the
+// library.
+namespace TessikSDK::Cholesky {
+
+/// One row of the lower triangle: (column, value) pairs with column <= row, ascending by column, so the
+/// diagonal entry comes last.
+using SparseRow = std::vector<std::pair<std::int32_t, double>>;
+using SparseSymmetricMatrix = std::vector<SparseRow>;
+
+/// A factored matrix M = L L^T of a symmetrically permuted M. Immutable once made; `solve` only reads it,
+/// so one factor may serve several threads at once.
+class LLTMatrix {
+ public:
+  virtual ~LLTMatrix();
+  /// Replaces b (input row order) by the solution x of M x = b. False, b unchanged, when its length is
+  /// not size().
+  virtual bool solve(std::vector<double>& b) const = 0;
+  virtual std::int32_t size() const = 0;
+};
+
+/// Exact minimum-degree elimination order: repeatedly eliminates the row with the fewest neighbours in the
+/// elimination graph (ties to the lowest index) and joins its neighbours into a clique. Returns each input
+/// row's new index. Each row's last entry is taken as its diagonal; any other entry whose column is not
+/// below the row (or is negative) adds no edge.
+std::vector<std::int32_t> minimumDegreeOrder(const SparseSymmetricMatrix& matrix);
+
+/// Up-looking factorisation of the matrix permuted by minimumDegreeOrder. Null when the matrix is not
+/// positive definite (a pivot at or below 0, or NaN) or a row lacks its diagonal entry (the row is empty,
+/// or its last entry is not on the diagonal); null too when a row's columns are not strictly ascending
+/// from 0 or above, since such a row has no single entry to read per column.
+std::unique_ptr<LLTMatrix> factorLLT(const SparseSymmetricMatrix& matrix);
+
+}  // namespace TessikSDK::Cholesky
