@@ -42,7 +42,7 @@
 #include "geombind/preparation.h"
 #include "geombind/transform_hierarchy.h"
 #include "headless_gl/headless_gl.h"
-#include "meshes/mesh_builders.h"
+#include "meshes/character.h"
 
 namespace {
 
@@ -54,7 +54,6 @@ using TessikSDK::GeomBind::TransformHierarchyImpl;
 using TessikSDK::GeomBind::VertexWeights;
 namespace Algorithm = TessikSDK::GeomBind::Algorithm;
 namespace meshes = tessik::meshes;
-using Vec3 = meshes::Vec3;
 
 class NoProgress : public IProgress {
  public:
@@ -84,123 +83,6 @@ class CoutSilencer {
   std::streambuf* saved_;
 };
 
-Vec3 Add(const Vec3& a, const Vec3& b) { return {a[0] + b[0], a[1] + b[1], a[2] + b[2]}; }
-Vec3 Sub(const Vec3& a, const Vec3& b) { return {a[0] - b[0], a[1] - b[1], a[2] - b[2]}; }
-Vec3 Scale(const Vec3& a, float s) { return {a[0] * s, a[1] * s, a[2] * s}; }
-Vec3 Cross(const Vec3& a, const Vec3& b) {
-  return {a[1] * b[2] - a[2] * b[1], a[2] * b[0] - a[0] * b[2], a[0] * b[1] - a[1] * b[0]};
-}
-float Length(const Vec3& a) { return std::sqrt(a[0] * a[0] + a[1] * a[1] + a[2] * a[2]); }
-Vec3 Normalized(const Vec3& a) { return Scale(a, 1.0f / Length(a)); }
-
-// Maps the builders' x, y, z axes onto `xAxis`, `yAxis` (perpendicular to each other) and the direction
-// of xAxis x yAxis scaled to `zLength`, then moves by `origin`. Such a frame is right-handed, so the
-// winding stays outward; a mirror would flip it.
-meshes::TriMesh Placed(
-    meshes::TriMesh m, const Vec3& origin, const Vec3& xAxis, const Vec3& yAxis, float zLength) {
-  const Vec3 zAxis = Scale(Normalized(Cross(xAxis, yAxis)), zLength);
-  for (Vec3& p : m.positions)
-    p = Add(origin, Add(Scale(xAxis, p[0]), Add(Scale(yAxis, p[1]), Scale(zAxis, p[2]))));
-  return m;
-}
-
-// Any unit vector perpendicular to `d`, so that (d, it, d x it) is right-handed.
-Vec3 Perpendicular(const Vec3& d) {
-  const Vec3 helper = std::fabs(d[1]) < 0.9f ? Vec3{0.0f, 1.0f, 0.0f} : Vec3{1.0f, 0.0f, 0.0f};
-  return Normalized(Cross(helper, d));
-}
-
-// A capped cylinder from `a` to `b`.
-meshes::TriMesh Limb(const Vec3& a, const Vec3& b, float radius, int rings, int segments) {
-  const Vec3 axis = Sub(b, a);
-  const float length = Length(axis);
-  const Vec3 d = Scale(axis, 1.0f / length);
-  return Placed(meshes::cylinderX(0.0f, length, 0.0f, 0.0f, radius, rings, segments), a, d, Perpendicular(d),
-                1.0f);
-}
-
-// An ellipsoid with semi-axes `radii` along x, y, z, centred at `c`.
-meshes::TriMesh Ellipsoid(const Vec3& c, const Vec3& radii, int rings, int segments) {
-  return Placed(meshes::sphere({0.0f, 0.0f, 0.0f}, 1.0f, rings, segments), c, {radii[0], 0.0f, 0.0f},
-                {0.0f, radii[1], 0.0f}, radii[2]);
-}
-
-// Joints in metres: y up, the character faces +z, its left side at +x. Arms hang 20 degrees below
-// horizontal and legs spread slightly, so no limb lies along a grid axis.
-struct Skeleton {
-  std::vector<std::string> names;
-  std::vector<Vec3> joints;
-  std::vector<std::string> parents;
-
-  const Vec3& at(const std::string& name) const {
-    return joints[static_cast<std::size_t>(std::find(names.begin(), names.end(), name) - names.begin())];
-  }
-  void add(const std::string& name, const Vec3& joint, const std::string& parent) {
-    names.push_back(name);
-    joints.push_back(joint);
-    parents.push_back(parent);
-  }
-};
-
-Skeleton MakeSkeleton() {
-  Skeleton s;
-  s.add("pelvis", {0.0f, 0.92f, 0.0f}, "");
-  s.add("spine1", {0.0f, 1.05f, 0.0f}, "pelvis");
-  s.add("spine2", {0.0f, 1.18f, 0.0f}, "spine1");
-  s.add("chest", {0.0f, 1.32f, 0.0f}, "spine2");
-  s.add("neck", {0.0f, 1.47f, 0.0f}, "chest");
-  s.add("head", {0.0f, 1.62f, 0.0f}, "neck");
-  const float down = 0.34906585f;  // 20 degrees
-  for (const float side : {1.0f, -1.0f}) {
-    const std::string p = side > 0 ? "l_" : "r_";
-    const Vec3 arm = {side * std::cos(down), -std::sin(down), 0.0f};
-    const Vec3 shoulder = {side * 0.2f, 1.40f, 0.0f};
-    s.add(p + "clavicle", {side * 0.07f, 1.40f, 0.0f}, "chest");
-    s.add(p + "shoulder", shoulder, p + "clavicle");
-    s.add(p + "elbow", Add(shoulder, Scale(arm, 0.28f)), p + "shoulder");
-    s.add(p + "wrist", Add(shoulder, Scale(arm, 0.53f)), p + "elbow");
-    for (const float offset : {0.02f, -0.02f}) {
-      const std::string finger = p + (offset > 0 ? "index" : "middle");
-      const Vec3 base = Add(Add(shoulder, Scale(arm, 0.64f)), {0.0f, 0.0f, offset});
-      s.add(finger + "1", base, p + "wrist");
-      s.add(finger + "2", Add(base, Scale(arm, 0.045f)), finger + "1");
-    }
-    s.add(p + "hip", {side * 0.1f, 0.88f, 0.0f}, "pelvis");
-    s.add(p + "knee", {side * 0.12f, 0.49f, 0.0f}, p + "hip");
-    s.add(p + "ankle", {side * 0.13f, 0.09f, 0.0f}, p + "knee");
-    s.add(p + "toe", {side * 0.13f, 0.035f, 0.15f}, p + "ankle");
-  }
-  return s;
-}
-
-// Overlapping closed shells, one per body part, tessellated to about 50k triangles in all.
-meshes::TriMesh MakeBody(const Skeleton& s) {
-  meshes::TriMesh body;
-  body.append(Limb({0.0f, 0.82f, 0.0f}, {0.0f, 1.46f, 0.0f}, 0.16f, 48, 80));  // torso
-  body.append(Limb({0.0f, 1.42f, 0.0f}, {0.0f, 1.58f, 0.0f}, 0.055f, 8, 48));  // neck
-  body.append(Ellipsoid({0.0f, 1.68f, 0.01f}, {0.1f, 0.12f, 0.11f}, 40, 80));  // head
-  for (const std::string p : {"l_", "r_"}) {
-    const Vec3 arm = Normalized(Sub(s.at(p + "wrist"), s.at(p + "shoulder")));
-    body.append(Limb(Sub(s.at(p + "shoulder"), Scale(arm, 0.05f)), s.at(p + "elbow"), 0.055f, 40, 48));
-    body.append(Limb(Sub(s.at(p + "elbow"), Scale(arm, 0.03f)), s.at(p + "wrist"), 0.042f, 40, 48));
-    // A flattened hand, then two fingers out of its far end.
-    const Vec3 palm = Add(s.at(p + "wrist"), Scale(arm, 0.06f));
-    body.append(Placed(meshes::sphere({0.0f, 0.0f, 0.0f}, 1.0f, 16, 32), palm, Scale(arm, 0.07f),
-                       Scale(Cross({0.0f, 0.0f, 1.0f}, arm), 0.022f), 0.045f));
-    for (const std::string finger : {"index", "middle"}) {
-      const Vec3& base = s.at(p + finger + "1");
-      body.append(Limb(Sub(base, Scale(arm, 0.02f)), Add(base, Scale(arm, 0.09f)), 0.012f, 6, 16));
-    }
-    body.append(Limb(Add(s.at(p + "hip"), {0.0f, 0.06f, 0.0f}), s.at(p + "knee"), 0.075f, 40, 48));
-    // The shin runs on below the ankle so that the joint sits inside it, not on its cap.
-    const Vec3& ankle = s.at(p + "ankle");
-    body.append(
-        Limb(Add(s.at(p + "knee"), {0.0f, 0.03f, 0.0f}), Add(ankle, {0.0f, -0.04f, 0.0f}), 0.052f, 40, 48));
-    body.append(Ellipsoid({ankle[0], 0.045f, 0.06f}, {0.05f, 0.045f, 0.14f}, 16, 32));  // foot
-  }
-  return body;
-}
-
 struct Character {
   MeshData mesh;  // as the host hands it over: not yet prepared
   HierarchyData hierarchy;
@@ -208,17 +90,15 @@ struct Character {
 
 const Character& TheCharacter() {
   static const Character character = [] {
-    const Skeleton skeleton = MakeSkeleton();
-    const meshes::TriMesh body = MakeBody(skeleton);
+    const meshes::Character source = meshes::character(1.0);
     MeshImpl mesh;
-    for (const Vec3& p : body.positions) mesh.addVertex(p[0], p[1], p[2]);
-    for (const auto& t : body.triangles) mesh.addTriangle(t[0], t[1], t[2]);
+    for (const meshes::Vec3& p : source.mesh.positions) mesh.addVertex(p[0], p[1], p[2]);
+    for (const auto& t : source.mesh.triangles) mesh.addTriangle(t[0], t[1], t[2]);
     TransformHierarchyImpl hierarchy;
-    for (std::size_t i = 0; i < skeleton.names.size(); ++i) {
-      const Vec3& j = skeleton.joints[i];
+    for (const meshes::Bone& bone : source.bones) {
+      const meshes::Vec3& j = bone.position;
       const std::array<double, 16> matrix = {1, 0, 0, j[0], 0, 1, 0, j[1], 0, 0, 1, j[2], 0, 0, 0, 1};
-      const std::string& parent = skeleton.parents[i];
-      hierarchy.addNode(skeleton.names[i].c_str(), matrix.data(), parent.empty() ? nullptr : parent.c_str());
+      hierarchy.addNode(bone.name.c_str(), matrix.data(), bone.parentName());
     }
     return Character{std::move(mesh.data), std::move(hierarchy.data)};
   }();

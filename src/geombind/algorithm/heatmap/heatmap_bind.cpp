@@ -1,6 +1,14 @@
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
 
 #include <cmath>
+#include <map>
+
+#include <glm/geometric.hpp>
+
+#include "geombind/algorithm/heatmap/heat_sources.h"
+#include "geombind/algorithm/heatmap/heat_system.h"
+#include "geombind/algorithm/weight_lists.h"
+#include "geombind/collision/octree.h"
 
 namespace TessikSDK::GeomBind::Algorithm {
 
@@ -27,10 +35,102 @@ void computeVertexNormals(MeshData& mesh) {
   }
 }
 
+std::vector<double> triangleAreas(const MeshData& mesh) {
+  std::vector<double> areas;
+  areas.reserve(mesh.triangles.size());
+  for (const TriangleRecord& t : mesh.triangles) {
+    const auto& a = mesh.vertices[t[0]].position;
+    const auto& b = mesh.vertices[t[1]].position;
+    const auto& c = mesh.vertices[t[2]].position;
+    const float u[3] = {b[0] - a[0], b[1] - a[1], b[2] - a[2]};
+    const float w[3] = {c[0] - a[0], c[1] - a[1], c[2] - a[2]};
+    const double cx = double(u[1]) * w[2] - double(u[2]) * w[1];
+    const double cy = double(u[2]) * w[0] - double(u[0]) * w[2];
+    const double cz = double(u[0]) * w[1] - double(u[1]) * w[0];
+    const double squared = cx * cx + cy * cy + cz * cz;
+    const double area = 0.5 * std::sqrt(squared);
+    // The limit is absolute: the mesh is already in the unit frame.
+    if (!(squared > 0.0) || area < 1e-10) return {};
+    areas.push_back(area);
+  }
+  return areas;
+}
+
 HeatmapBind::~HeatmapBind() = default;
 
-VertexWeights HeatmapBind::bind(const MeshData&, HierarchyData&, const IBindOptions&, IProgress&) {
-  return {};
+VertexWeights HeatmapBind::bind(const MeshData& mesh,
+                                HierarchyData& hierarchy,
+                                const IBindOptions& baseOptions,
+                                IProgress& progress) {
+  const auto* options = dynamic_cast<const HeatmapOptions*>(&baseOptions);
+  if (options == nullptr) return {};
+  if (hierarchy.nodeCount() == 0 || mesh.vertices.empty() || mesh.triangles.empty()) return {};
+  const std::vector<double> areas = triangleAreas(mesh);
+  if (areas.empty()) return {};
+
+  progress.begin("Computing Heatmap weights ... ", 6, 0);
+  progress.update(0);
+  Collision::Octree octree;
+  bool octreeBuilt = false;
+  if (!progress.isCanceled()) {
+    octree.reset(mesh.boundingBox);
+    for (const TriangleRecord& t : mesh.triangles) {
+      auto corner = [&](int k) {
+        const auto& p = mesh.vertices[t[k]].position;
+        return glm::dvec3(p[0], p[1], p[2]);
+      };
+      octree.insert(new Collision::OctreeElement<Collision::Triangle>(
+          Collision::Triangle(corner(0), corner(1), corner(2))));
+    }
+    octree.build(0, 10);
+    octreeBuilt = true;
+  }
+
+  progress.update(1);
+  HeatSources sources;
+  if (!progress.isCanceled()) sources = collectHeatSources(hierarchy);
+  // A twentieth of the half diagonal of the octree box: enough to leave the surface, small next to a limb.
+  const glm::dvec3 halfDiagonal =
+      octreeBuilt ? (octree.bounds.upper - octree.bounds.lower) * 0.5 : glm::dvec3(0.0);
+  const auto pushDistance =
+      static_cast<float>(static_cast<double>(0.05f) * std::sqrt(glm::dot(halfDiagonal, halfDiagonal)));
+  pushBonesOffVertices(mesh, hierarchy, pushDistance);
+  SourceVisibility visibility;
+  if (!progress.isCanceled()) {
+    visibility = computeSourceVisibility(mesh, hierarchy, octree, sources,
+                                         static_cast<double>(options->falloff), pushDistance);
+  }
+  if (!visibility.anyVisible) return {};
+
+  progress.update(2);
+  VertexWeights weights;
+  if (!progress.isCanceled() && !solveHeat(mesh, areas, visibility, weights)) return {};
+
+  progress.update(3);
+  if (progress.isCanceled()) {
+    // Lists still indexed by heat source must never be handed out as bone weights.
+    progress.end();
+    return {};
+  }
+  const std::size_t tips = sources.tipJoints.size();
+  for (std::vector<BoneWeight>& list : weights) {
+    std::map<std::uint32_t, double> byBone;
+    for (const BoneWeight& w : list) {
+      const std::uint32_t bone = w.boneIndex < tips ? sources.tipJoints[w.boneIndex]
+                                                    : sources.boneSegments[w.boneIndex - tips].first;
+      byBone[bone] += w.weight;
+    }
+    list.clear();
+    for (const auto& [bone, weight] : byBone) list.push_back(BoneWeight{bone, weight});
+    normalizeWeights(list);
+  }
+
+  progress.update(4);
+  if (!progress.isCanceled()) truncateWeights(options->influenceLimit, weights);
+  progress.update(5);
+  if (!progress.isCanceled()) normalizeAllWeights(weights);
+  progress.end();
+  return weights;
 }
 
 }  // namespace TessikSDK::GeomBind::Algorithm

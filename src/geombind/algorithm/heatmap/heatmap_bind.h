@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <vector>
 
 #include "geombind/algorithm/bind_strategy.h"
 
@@ -14,7 +15,17 @@ struct HeatmapOptions : IBindOptions {
 /// Area-weighted vertex normals, unit length. A vertex no triangle uses keeps the normal (0, 0, 0).
 void computeVertexNormals(MeshData& mesh);
 
-/// Heat-diffusion binding. Not available yet in this build: bind returns an empty list.
+/// Triangle areas in double from the single-precision edge vectors; empty when any triangle is degenerate
+/// (zero cross product or an area below 1e-10 in the unit frame).
+std::vector<double> triangleAreas(const MeshData& mesh);
+
+/// Heat-diffusion binding: every bone heats the vertices that see it among their nearest bones, the heat
+/// diffuses over the surface (cotangent Laplacian, one sparse Cholesky factorisation, one solve per heat
+/// source), and each bone's equilibrium temperature is its weight. Moves bones that sit exactly on a
+/// vertex slightly inside (in the hierarchy itself). Lists hold bones in ascending order unless cut to
+/// `influenceLimit`, then sorted by weight, largest first, ties by bone index; weights sum to 1. Empty
+/// result for options of another method, no bones, vertices or triangles, a degenerate triangle, no
+/// vertex seeing a bone, a singular system, or a cancelled run. Needs no OpenGL.
 class HeatmapBind : public IBindStrategy {
  public:
   ~HeatmapBind() override;
