@@ -20,7 +20,8 @@ bool touches(const AABB& box, const Triangle& triangle) {
   const glm::dvec3 centre = (box.lower + box.upper) * 0.5;
   const glm::dvec3 half = (box.upper - box.lower) * 0.5;
   for (int k = 0; k < 3; ++k) {
-    const double q0 = triangle.a[k] - centre[k], q1 = triangle.b[k] - centre[k], q2 = triangle.c[k] - centre[k];
+    const double q0 = triangle.a[k] - centre[k], q1 = triangle.b[k] - centre[k],
+                 q2 = triangle.c[k] - centre[k];
     if (std::min({q0, q1, q2}) > half[k] || std::max({q0, q1, q2}) < -half[k]) return false;
   }
   return triangleBoxOverlap(centre, half, triangle);
