@@ -33,6 +33,7 @@
 #include <benchmark/benchmark.h>
 #include <sys/resource.h>
 
+#include "common/gl_context.h"
 #include "diagnostics/stage_profiler.h"
 #include "geombind/algorithm/geodesic/geodesic_sparse_voxel_bind.h"
 #include "geombind/algorithm/geodesic/sparse_voxels.h"
@@ -41,7 +42,6 @@
 #include "geombind/mesh.h"
 #include "geombind/preparation.h"
 #include "geombind/transform_hierarchy.h"
-#include "headless_gl/headless_gl.h"
 #include "meshes/character.h"
 
 namespace {
@@ -105,40 +105,6 @@ const Character& TheCharacter() {
   return character;
 }
 
-// The context is made on first use so that a run filtered down to nothing never needs a driver; main()
-// destroys it before static destruction, while the driver is still loaded.
-struct GLState {
-  bool tried = false;
-  std::optional<tessik::support::HeadlessGLContext> context;
-  std::string error;
-};
-
-GLState& TheGL() {
-  static GLState state;
-  return state;
-}
-
-// Empty when a context is current on this thread, otherwise why there is none.
-const std::string& EnsureGL() {
-  GLState& gl = TheGL();
-  if (!gl.tried) {
-    gl.tried = true;
-    gl.context = tessik::support::HeadlessGLContext::create(&gl.error);
-    if (!gl.context) {
-      if (gl.error.empty()) gl.error = "no headless OpenGL context";
-    } else {
-      // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only
-      // that it found no X display.
-      const GLenum glew = glewInit();
-      if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
-        gl.error = std::string("glewInit: ") + reinterpret_cast<const char*>(glewGetErrorString(glew));
-        gl.context.reset();
-      }
-    }
-  }
-  return gl.error;
-}
-
 // "    Voxelizing internal volume" -> "grids_voxelizing_internal_volume"; "Compute Weights" ->
 // "compute_weights". Benchmark output formats break on spaces in counter names.
 std::string CounterName(const std::string& label) {
@@ -187,7 +153,7 @@ VoxelCounts CountSparseVoxels(const Character& character, std::int32_t resolutio
 }
 
 void BM_GeodesicBind(benchmark::State& state) {
-  const std::string& error = EnsureGL();
+  const std::string& error = tessik::bench::ensureGL();
   if (!error.empty()) {
     state.SkipWithError(error.c_str());
     return;
@@ -288,6 +254,6 @@ int main(int argc, char** argv) {
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
   benchmark::RunSpecifiedBenchmarks();
   benchmark::Shutdown();
-  TheGL().context.reset();
+  tessik::bench::releaseGL();
   return 0;
 }

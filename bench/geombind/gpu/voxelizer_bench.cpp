@@ -29,10 +29,10 @@
 #include <glm/vec3.hpp>
 #include <omp.h>
 
+#include "common/gl_context.h"
 #include "geombind/gpu/slice_voxelizer.h"
 #include "geombind/mesh.h"
 #include "geombind/voxel_bit_grid.h"
-#include "headless_gl/headless_gl.h"
 #include "meshes/mesh_builders.h"
 
 namespace {
@@ -73,40 +73,6 @@ const MeshData& TheMesh() {
   return mesh;
 }
 
-// The context is made on first use so that a run filtered down to nothing GL-related never needs a
-// driver; main() destroys it before static destruction, while the driver is still loaded.
-struct GLState {
-  bool tried = false;
-  std::optional<tessik::support::HeadlessGLContext> context;
-  std::string error;
-};
-
-GLState& TheGL() {
-  static GLState state;
-  return state;
-}
-
-// Empty when a context is current on this thread, otherwise why there is none.
-const std::string& EnsureGL() {
-  GLState& gl = TheGL();
-  if (!gl.tried) {
-    gl.tried = true;
-    gl.context = tessik::support::HeadlessGLContext::create(&gl.error);
-    if (!gl.context) {
-      if (gl.error.empty()) gl.error = "no headless OpenGL context";
-    } else {
-      // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only
-      // that it found no X display.
-      const GLenum glew = glewInit();
-      if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
-        gl.error = std::string("glewInit: ") + reinterpret_cast<const char*>(glewGetErrorString(glew));
-        gl.context.reset();
-      }
-    }
-  }
-  return gl.error;
-}
-
 double SecondsSince(std::chrono::steady_clock::time_point start) {
   return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
 }
@@ -131,7 +97,7 @@ std::uint64_t CountDifferent(const VoxelBitGrid& a, const VoxelBitGrid& b) {
 }
 
 void BM_VoxelizeInterior(benchmark::State& state) {
-  const std::string& error = EnsureGL();
+  const std::string& error = tessik::bench::ensureGL();
   if (!error.empty()) {
     state.SkipWithError(error.c_str());
     return;
@@ -288,7 +254,7 @@ void BM_CpuRayParity(benchmark::State& state) {
 
   // Runs alone (filtered) still get their comparison, at the price of one untimed voxelization.
   auto found = GpuGrids().find(n);
-  if (found == GpuGrids().end() && EnsureGL().empty()) {
+  if (found == GpuGrids().end() && tessik::bench::ensureGL().empty()) {
     VoxelBitGrid gpu(n, n, n);
     NoProgress progress;
     Gpu::voxelizeInterior(progress, mesh, gpu, false, 0.0f);
@@ -342,6 +308,6 @@ int main(int argc, char** argv) {
   benchmark::RunSpecifiedBenchmarks();
   benchmark::Shutdown();
   GpuGrids().clear();
-  TheGL().context.reset();
+  tessik::bench::releaseGL();
   return 0;
 }

@@ -1,0 +1,49 @@
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include <GL/glew.h>
+
+#include "headless_gl/headless_gl.h"
+
+// The benchmarks' one headless OpenGL context, made on first use so that a run filtered down to nothing
+// GL-related never needs a driver. Call releaseGL() at the end of main(), while the driver is still
+// loaded, rather than leaving it to static destruction.
+namespace tessik::bench {
+
+struct GLState {
+  bool tried = false;
+  std::optional<support::HeadlessGLContext> context;
+  std::string error;
+};
+
+inline GLState& theGL() {
+  static GLState state;
+  return state;
+}
+
+/// Empty when a context is current on this thread, otherwise why there is none.
+inline const std::string& ensureGL() {
+  GLState& gl = theGL();
+  if (!gl.tried) {
+    gl.tried = true;
+    gl.context = support::HeadlessGLContext::create(&gl.error);
+    if (!gl.context) {
+      if (gl.error.empty()) gl.error = "no headless OpenGL context";
+    } else {
+      // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only
+      // that it found no X display.
+      const GLenum glew = glewInit();
+      if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
+        gl.error = std::string("glewInit: ") + reinterpret_cast<const char*>(glewGetErrorString(glew));
+        gl.context.reset();
+      }
+    }
+  }
+  return gl.error;
+}
+
+inline void releaseGL() { theGL().context.reset(); }
+
+}  // namespace tessik::bench
