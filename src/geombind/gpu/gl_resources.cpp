@@ -46,7 +46,9 @@ FormatInfo formatInfo(GLenum internalFormat) {
   return table.entries[internalFormat];
 }
 
-Texture2D::~Texture2D() {
+Texture2D::~Texture2D() { release(); }
+
+void Texture2D::release() {
   if (glIsTexture(id)) glDeleteTextures(1, &id);
   id = 0;
   width = 0;
@@ -55,13 +57,7 @@ Texture2D::~Texture2D() {
 }
 
 void Texture2D::create(GLenum newFormat, std::uint32_t newWidth, std::uint32_t newHeight, const void* data) {
-  if (glIsTexture(id)) {
-    glDeleteTextures(1, &id);
-    id = 0;
-    width = 0;
-    height = 0;
-    internalFormat = 0;
-  }
+  release();
   internalFormat = newFormat;
   width = newWidth;
   height = newHeight;
@@ -96,7 +92,9 @@ void Texture2D::unbind(std::uint32_t unit) const {
   glBindTexture(GL_TEXTURE_2D, 0);
 }
 
-RenderBuffer::~RenderBuffer() {
+RenderBuffer::~RenderBuffer() { release(); }
+
+void RenderBuffer::release() {
   if (glIsRenderbuffer(id)) glDeleteRenderbuffers(1, &id);
   id = 0;
   width = 0;
@@ -105,13 +103,7 @@ RenderBuffer::~RenderBuffer() {
 }
 
 void RenderBuffer::create(GLenum newFormat, std::uint32_t newWidth, std::uint32_t newHeight) {
-  if (glIsRenderbuffer(id)) {
-    glDeleteRenderbuffers(1, &id);
-    id = 0;
-    width = 0;
-    height = 0;
-    internalFormat = 0;
-  }
+  release();
   internalFormat = newFormat;
   width = newWidth;
   height = newHeight;

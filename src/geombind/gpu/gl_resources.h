@@ -43,6 +43,10 @@ class Texture2D {
   std::uint32_t width = 0;
   std::uint32_t height = 0;
   GLenum internalFormat = 0;
+
+ private:
+  /// Deletes the texture (behind glIsTexture) and zeroes the fields.
+  void release();
 };
 
 class RenderBuffer {
@@ -58,6 +62,9 @@ class RenderBuffer {
   std::uint32_t width = 0;
   std::uint32_t height = 0;
   GLenum internalFormat = 0;
+
+ private:
+  void release();
 };
 
 class FrameBuffer {
