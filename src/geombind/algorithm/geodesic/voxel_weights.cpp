@@ -4,6 +4,7 @@
 
 #include <glm/geometric.hpp>
 
+#include "geombind/algorithm/geodesic/geodesic_distances.h"
 #include "geombind/algorithm/weight_lists.h"
 #include "geombind/parallel.h"
 
@@ -31,7 +32,11 @@ VertexWeights computeWeights(const Collision::Octree& octree,
     list.resize(boneCount);
     bool anyInfinite = false;
     for (std::uint32_t b = 0; b < boneCount; ++b) {
-      const double raw = 1.0 / std::pow(static_cast<double>(voxel.distances[b]) + toCentre, exponent);
+      // Distances are missing when their stage was skipped (a progress object that cancelled only then).
+      const float d = b < voxel.distances.size() ? voxel.distances[b] : kUnreached;
+      // No path reached this voxel from the bone. In double precision (largest float)^5 does not overflow,
+      // so the power alone would leave a tiny weight; an unreached bone weighs nothing.
+      const double raw = d >= kUnreached ? 0.0 : 1.0 / std::pow(static_cast<double>(d) + toCentre, exponent);
       list[b] = BoneWeight{b, raw};
       anyInfinite = anyInfinite || std::isinf(raw);
     }

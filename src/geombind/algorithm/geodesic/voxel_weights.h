@@ -10,9 +10,10 @@
 namespace TessikSDK::GeomBind::Algorithm {
 
 /// Per vertex, one weight per bone, 1 / (voxel distance + distance to the voxel centre)^exponent, scaled
-/// to sum 1. The vertex takes the first (in list order) sparse voxel whose box contains it; a vertex in
-/// no voxel gets an empty list. Bones at total distance 0 (a vertex at the very centre of a seed voxel)
-/// share the vertex equally rather than producing infinities. Empty when the octree is unbuilt.
+/// to sum 1; a bone no path reaches weighs exactly 0 (all 0 when none reaches the vertex). The vertex takes
+/// the first (in list order) sparse voxel whose box contains it; a vertex in no voxel gets an empty list.
+/// Bones at total distance 0 (a vertex at the very centre of a seed voxel) share the vertex equally rather
+/// than producing infinities. Empty when the octree is unbuilt.
 VertexWeights computeWeights(const Collision::Octree& octree,
                              const MeshData& mesh,
                              const VoxelMap& voxelMap,

@@ -157,7 +157,7 @@ TEST_F(GeodesicBind, SeparateShellsNeverShareBones) {
     const bool left = v < half;
     for (const auto& [bone, weight] : bound.weights[v]) {
       if ((bone < 2) != left) {
-        EXPECT_LE(weight, 1e-12) << "vertex " << v << " bone " << bone;
+        EXPECT_EQ(weight, 0.0) << "vertex " << v << " bone " << bone;
       }
     }
   }

@@ -158,6 +158,17 @@ TEST(GeodesicWeights, FalloffExponentSetsTheRatio) {
   }
 }
 
+TEST(GeodesicWeights, MissingDistancesCountAsUnreached) {
+  // What the weights see when a host's progress object cancelled only the distance stage.
+  UniformVoxels grid(1);
+  MeshData mesh;
+  mesh.vertices.push_back({{0, 0, 0}, {0.25f, 0.25f, 0.25f}});
+  const VertexWeights w = computeWeights(grid.octree, mesh, grid.voxelMap, 2, 5.0);
+  ASSERT_EQ(w[0].size(), 2u);
+  EXPECT_EQ(w[0][0].weight, 0.0);
+  EXPECT_EQ(w[0][1].weight, 0.0);
+}
+
 TEST(GeodesicWeights, ZeroTotalDistanceSharesTheVertexWithoutNaN) {
   const VertexWeights w = twoBoneWeights(30.0, 0.0f, 0.0f);
   EXPECT_EQ(w[0][0].weight, 0.5);
