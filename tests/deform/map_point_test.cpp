@@ -194,10 +194,4 @@ TEST(CorvanePrecompute, SameBitsForAnyThreadCount) {
   }
 }
 
-TEST(CorvanePrecompute, NoBonesIsANoOp) {
-  InspectableCorvane engine;
-  engine.PreComputeBoneXFormTMs();
-  EXPECT_EQ(engine.boneCount(), 0u);
-}
-
 }  // namespace
