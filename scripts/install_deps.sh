@@ -8,6 +8,7 @@ packages=(
   libtbb-dev libglm-dev libglew-dev
   libegl-dev libgl-dev libegl-mesa0 libgl1-mesa-dri
   libgtest-dev libbenchmark-dev libeigen3-dev
+  python3-dev pybind11-dev python3-numpy python3-pytest
 )
 
 missing=()
