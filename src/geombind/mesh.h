@@ -38,6 +38,15 @@ struct MeshData {
   float normalizeScale = 1.0f;
 };
 
+/// The triangle's corners widened to double, in its winding order: what the spatial queries work on.
+inline Collision::Triangle triangleOf(const MeshData& mesh, const TriangleRecord& t) {
+  auto corner = [&](int k) {
+    const auto& p = mesh.vertices[t[k]].position;
+    return glm::dvec3(p[0], p[1], p[2]);
+  };
+  return Collision::Triangle(corner(0), corner(1), corner(2));
+}
+
 class MeshImpl : public IMesh {
  public:
   void addVertex(float x, float y, float z) override;

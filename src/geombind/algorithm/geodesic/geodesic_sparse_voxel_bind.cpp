@@ -31,12 +31,7 @@ void computeOctree(IProgress& progress,
   const int triangleCount = static_cast<int>(mesh.triangles.size());
   progress.begin("Computing Octree ... ", triangleCount, 0);
   for (const TriangleRecord& t : mesh.triangles) {
-    auto corner = [&](int k) {
-      const auto& p = mesh.vertices[t[k]].position;
-      return glm::dvec3(p[0], p[1], p[2]);
-    };
-    octree.insert(new Collision::OctreeElement<Collision::Triangle>(
-        Collision::Triangle(corner(0), corner(1), corner(2))));
+    octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
     progress.update(0);
     if (progress.isCanceled()) return;
   }

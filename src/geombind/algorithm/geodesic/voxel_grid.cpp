@@ -45,11 +45,7 @@ void voxelizeBoundary(IProgress& progress, const MeshData& mesh, VoxelBitGrid& g
   for (std::int64_t t = 0; t < count; ++t) {
     if (progress.isCanceled()) continue;
     const TriangleRecord& record = mesh.triangles[static_cast<std::size_t>(t)];
-    auto corner = [&](int k) {
-      const auto& p = mesh.vertices[record[k]].position;
-      return glm::dvec3(p[0], p[1], p[2]);
-    };
-    const Collision::Triangle triangle(corner(0), corner(1), corner(2));
+    const Collision::Triangle triangle = triangleOf(mesh, record);
     const Collision::AABB bounds(triangle);
     std::uint32_t lo[3], hi[3];
     for (int k = 0; k < 3; ++k) {

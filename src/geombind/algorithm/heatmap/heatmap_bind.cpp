@@ -75,12 +75,7 @@ VertexWeights HeatmapBind::bind(const MeshData& mesh,
   if (!progress.isCanceled()) {
     octree.reset(mesh.boundingBox);
     for (const TriangleRecord& t : mesh.triangles) {
-      auto corner = [&](int k) {
-        const auto& p = mesh.vertices[t[k]].position;
-        return glm::dvec3(p[0], p[1], p[2]);
-      };
-      octree.insert(new Collision::OctreeElement<Collision::Triangle>(
-          Collision::Triangle(corner(0), corner(1), corner(2))));
+      octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
     }
     octree.build(0, 10);
     octreeBuilt = true;

@@ -52,11 +52,7 @@ struct Scene {
     }
     octree.reset(Collision::AABB(glm::dvec3(-2), glm::dvec3(7)));
     for (const auto& t : mesh.triangles) {
-      auto at = [&](int k) {
-        const auto& p = mesh.vertices[t[k]].position;
-        return glm::dvec3(p[0], p[1], p[2]);
-      };
-      octree.insert(new Collision::OctreeElement<Collision::Triangle>({at(0), at(1), at(2)}));
+      octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
     }
     octree.build(0, 4);
   }
