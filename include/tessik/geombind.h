@@ -109,7 +109,8 @@ class TESSIK_API IContext {
                                                         int resolution,
                                                         bool refineInterior) = 0;
 
-  /// Heat-diffusion binding; needs no OpenGL. Arguments and result as bindGeodesicSparseVoxel.
+  /// Heat-diffusion binding. Issues no OpenGL calls itself (the context still had to be created with a GL
+  /// context current). Arguments and result as bindGeodesicSparseVoxel, without the voxel options.
   virtual ISparseVertexWeights* bindHeatmap(IMesh* mesh,
                                             ITransformHierarchy* hierarchy,
                                             IProgress* progress,

@@ -25,7 +25,8 @@ std::vector<double> triangleAreas(const MeshData& mesh);
 /// vertex slightly inside (in the hierarchy itself). Lists hold bones in ascending order unless cut to
 /// `influenceLimit`, then sorted by weight, largest first, ties by bone index; weights sum to 1. Empty
 /// result for options of another method, no bones, vertices or triangles, a degenerate triangle, no
-/// vertex seeing a bone, a singular system, or a cancelled run. Needs no OpenGL.
+/// vertex seeing a bone, a singular system, or a run cancelled before the fold into bones. Issues no
+/// OpenGL calls.
 class HeatmapBind : public IBindStrategy {
  public:
   ~HeatmapBind() override;
