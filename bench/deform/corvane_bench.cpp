@@ -16,6 +16,8 @@
 #include <tessik/corvane.h>
 #include <tessik/geom.h>
 
+#include "common/run_benchmarks.h"
+
 namespace {
 
 using TessikSDK::Corvane::CCorvane;
@@ -286,9 +288,5 @@ void RegisterAll() {
 
 int main(int argc, char** argv) {
   RegisterAll();
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
+  return tessik::bench::runBenchmarks(argc, argv);
 }

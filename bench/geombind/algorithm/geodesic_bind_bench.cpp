@@ -34,6 +34,7 @@
 #include <sys/resource.h>
 
 #include "common/gl_context.h"
+#include "common/run_benchmarks.h"
 #include "diagnostics/stage_profiler.h"
 #include "geombind/algorithm/geodesic/geodesic_sparse_voxel_bind.h"
 #include "geombind/algorithm/geodesic/sparse_voxels.h"
@@ -250,10 +251,7 @@ void RegisterAll() {
 
 int main(int argc, char** argv) {
   RegisterAll();
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
+  const int status = tessik::bench::runBenchmarks(argc, argv);
   tessik::bench::releaseGL();
-  return 0;
+  return status;
 }

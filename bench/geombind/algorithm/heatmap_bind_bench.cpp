@@ -36,6 +36,7 @@
 #include <sys/resource.h>
 
 #include "cholesky/llt.h"
+#include "common/run_benchmarks.h"
 #include "geombind/algorithm/heatmap/heat_sources.h"
 #include "geombind/algorithm/heatmap/heat_system.h"
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
@@ -306,9 +307,5 @@ void RegisterAll() {
 
 int main(int argc, char** argv) {
   RegisterAll();
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
+  return tessik::bench::runBenchmarks(argc, argv);
 }

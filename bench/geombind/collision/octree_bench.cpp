@@ -20,6 +20,7 @@
 #include <glm/geometric.hpp>
 #include <glm/vec3.hpp>
 
+#include "common/run_benchmarks.h"
 #include "geombind/collision/intersection.h"
 #include "geombind/collision/octree.h"
 #include "geombind/collision/primitives.h"
@@ -430,9 +431,5 @@ void RegisterAll() {
 
 int main(int argc, char** argv) {
   RegisterAll();
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
+  return tessik::bench::runBenchmarks(argc, argv);
 }

@@ -30,6 +30,7 @@
 #include <omp.h>
 
 #include "common/gl_context.h"
+#include "common/run_benchmarks.h"
 #include "geombind/gpu/slice_voxelizer.h"
 #include "geombind/mesh.h"
 #include "geombind/voxel_bit_grid.h"
@@ -303,11 +304,8 @@ void RegisterAll() {
 
 int main(int argc, char** argv) {
   RegisterAll();
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
+  const int status = tessik::bench::runBenchmarks(argc, argv);
   GpuGrids().clear();
   tessik::bench::releaseGL();
-  return 0;
+  return status;
 }
