@@ -9,6 +9,7 @@ packages=(
   libegl-dev libgl-dev libegl-mesa0 libgl1-mesa-dri
   libgtest-dev libbenchmark-dev libeigen3-dev
   python3-dev pybind11-dev python3-numpy python3-pytest
+  libassimp-dev assimp-testmodels nlohmann-json3-dev libcli11-dev libtinygltf-dev libstb-dev
 )
 
 missing=()

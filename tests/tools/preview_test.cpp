@@ -1,0 +1,195 @@
+#include "preview.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <cstdint>
+#include <cstdio>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include <GL/glew.h>
+#include <gtest/gtest.h>
+#include <stb_image.h>
+
+#include "pose.h"
+#include "support/gl_context_fixture.h"
+
+namespace {
+
+using namespace tessik::bind;
+
+using Rgb = std::array<int, 3>;
+
+Mat4 translate(double x, double y, double z) { return {1, 0, 0, x, 0, 1, 0, y, 0, 0, 1, z, 0, 0, 0, 1}; }
+
+// Each channel over the largest, so that shading, which scales all three alike, drops out.
+std::array<float, 3> chroma(float r, float g, float b) {
+  const float top = std::max({r, g, b, 1e-6f});
+  return {r / top, g / top, b / top};
+}
+
+// An open tube of radius 0.3 along +Y from y = 0 to 2 with joints at y = 0, 1 and 2: rings below y = 1
+// follow joint 0, rings above it joint 1, the middle ring both by half.
+class PreviewTube : public tessik::test::GLContextTest {
+ protected:
+  void SetUp() override {
+    GLContextTest::SetUp();
+    if (IsSkipped() || HasFatalFailure()) return;
+    constexpr int kRings = 9, kSegments = 24;
+    for (int r = 0; r < kRings; ++r) {
+      const float y = 2.0f * r / (kRings - 1);
+      for (int s = 0; s < kSegments; ++s) {
+        const float a = 6.2831853f * s / kSegments;
+        mesh.positions.push_back({0.3f * std::cos(a), y, 0.3f * std::sin(a)});
+        if (y < 1.0f) weights.influences.push_back({0, 1.0f});
+        if (y == 1.0f) weights.influences.insert(weights.influences.end(), {{0, 0.5f}, {1, 0.5f}});
+        if (y > 1.0f) weights.influences.push_back({1, 1.0f});
+        weights.offsets.push_back(static_cast<std::uint32_t>(weights.influences.size()));
+        if (r + 1 == kRings) continue;
+        const auto at = [&](int ring, int seg) {
+          return static_cast<std::uint32_t>(ring * kSegments + seg % kSegments);
+        };
+        mesh.triangles.push_back({at(r, s), at(r + 1, s), at(r, s + 1)});
+        mesh.triangles.push_back({at(r, s + 1), at(r + 1, s), at(r + 1, s + 1)});
+      }
+    }
+    skeleton.joints = {
+        {"hip", -1, translate(0, 0, 0)}, {"knee", 0, translate(0, 1, 0)}, {"toe", 1, translate(0, 2, 0)}};
+    for (const auto& joint : skeleton.joints) bindPoses.push_back(joint.bindPose);
+  }
+
+  std::vector<std::uint8_t> render(const SurfaceMesh& shown, const std::vector<Mat4>& world) const {
+    return renderPreviewPixels(shown, skeleton, world, weights, options);
+  }
+  Rgb pixel(const std::vector<std::uint8_t>& image, int x, int y) const {
+    const std::size_t i = (static_cast<std::size_t>(y) * options.width + x) * 4;
+    return {image[i], image[i + 1], image[i + 2]};
+  }
+
+  SurfaceMesh mesh;
+  Skeleton skeleton;
+  VertexWeights weights;
+  std::vector<Mat4> bindPoses;
+  PreviewOptions options{256, 320};
+};
+
+TEST_F(PreviewTube, ColoursEachEndByItsJoint) {
+  const std::vector<std::uint8_t> image = render(mesh, bindPoses);
+  ASSERT_EQ(image.size(), 256u * 320u * 4u);
+  const Rgb background = pixel(image, 0, 0);
+  const int cx = options.width / 2;
+  int top = 0, bottom = options.height - 1, right = cx;
+  while (top < bottom && pixel(image, cx, top) == background) ++top;
+  while (bottom > top && pixel(image, cx, bottom) == background) --bottom;
+  while (right + 1 < options.width && pixel(image, right + 1, (top + bottom) / 2) != background) ++right;
+  ASSERT_GT(bottom - top, options.height / 2) << "the tube should fill most of the height";
+  ASSERT_GT(right - cx, 8) << "the tube has no width";
+  // The tube is 0.6 wide and 2 long, plus the skeleton's end dots of a few pixels: not stretched.
+  EXPECT_NEAR(2.0 * (right - cx) / (bottom - top), 0.3, 0.02);
+
+  // A fifth of the way in from each end, halfway between the skeleton and the silhouette.
+  const int x = cx + (right - cx) / 2;
+  const Rgb low = pixel(image, x, bottom - (bottom - top) / 5);
+  const Rgb high = pixel(image, x, top + (bottom - top) / 5);
+  for (const auto& [seen, joint] : {std::make_pair(low, 0u), std::make_pair(high, 1u)}) {
+    const Vec3f c = jointColour(joint);
+    const auto expected = chroma(c[0], c[1], c[2]);
+    const auto actual =
+        chroma(static_cast<float>(seen[0]), static_cast<float>(seen[1]), static_cast<float>(seen[2]));
+    for (int k = 0; k < 3; ++k)
+      EXPECT_NEAR(actual[k], expected[k], 0.06f) << "joint " << joint << " channel " << k;
+  }
+  EXPECT_GT(std::abs(low[0] - high[0]) + std::abs(low[1] - high[1]) + std::abs(low[2] - high[2]), 90)
+      << "the two joints should look clearly different";
+}
+
+TEST_F(PreviewTube, DrawsTheSkeletonOverTheMesh) {
+  const std::vector<std::uint8_t> image = render(mesh, bindPoses);
+  // Only the skeleton is white; it runs up the middle, inside the tube, from y = 0 to 2.
+  int whiteRows = 0;
+  for (int y = 0; y < options.height; ++y) {
+    bool white = false;
+    for (int x = options.width / 2 - 2; x <= options.width / 2 + 1; ++x) {
+      const Rgb p = pixel(image, x, y);
+      white = white || std::min({p[0], p[1], p[2]}) >= 240;
+    }
+    whiteRows += white ? 1 : 0;
+  }
+  EXPECT_GT(whiteRows, options.height * 2 / 3);
+}
+
+TEST_F(PreviewTube, PosedMeshChangesThePicture) {
+  const std::vector<Mat4> posed = posedJointTransforms(skeleton, {{"knee", 0, 0, 90}});
+  const std::vector<std::uint8_t> rest = render(mesh, bindPoses);
+  const std::vector<std::uint8_t> bent = render(deformMesh(mesh, skeleton, posed, weights), posed);
+  ASSERT_EQ(rest.size(), bent.size());
+  int changed = 0;
+  for (std::size_t i = 0; i < rest.size(); i += 4)
+    changed += std::abs(rest[i] - bent[i]) + std::abs(rest[i + 1] - bent[i + 1]) > 40 ? 1 : 0;
+  EXPECT_GT(changed, options.width * options.height / 20);
+  // Bent, the tube is wider than the picture's aspect: the framing must still hold all of it.
+  const Rgb background = pixel(bent, 0, 0);
+  for (int x = 0; x < options.width; ++x)
+    for (int y : {0, options.height - 1}) ASSERT_EQ(pixel(bent, x, y), background) << x << ", " << y;
+  for (int y = 0; y < options.height; ++y)
+    for (int x : {0, options.width - 1}) ASSERT_EQ(pixel(bent, x, y), background) << x << ", " << y;
+}
+
+TEST_F(PreviewTube, WritesTheSamePictureAsPng) {
+  const std::string path = ::testing::TempDir() + "tessik_preview_test.png";
+  renderPreview(path, mesh, skeleton, bindPoses, weights, options);
+  int width = 0, height = 0, channels = 0;
+  stbi_uc* loaded = stbi_load(path.c_str(), &width, &height, &channels, 4);
+  std::remove(path.c_str());
+  ASSERT_NE(loaded, nullptr) << stbi_failure_reason();
+  const std::vector<std::uint8_t> file(loaded, loaded + static_cast<std::size_t>(width) * height * 4);
+  stbi_image_free(loaded);
+  EXPECT_EQ(width, options.width);
+  EXPECT_EQ(height, options.height);
+  EXPECT_TRUE(file == render(mesh, bindPoses)) << "the PNG differs from the pixels, or is upside down";
+
+  EXPECT_THROW(
+      renderPreview(::testing::TempDir() + "no/such/dir/p.png", mesh, skeleton, bindPoses, weights, options),
+      std::runtime_error);
+}
+
+TEST_F(PreviewTube, LeavesTheCallersGLStateAsItWas) {
+  glClearColor(0.1f, 0.2f, 0.3f, 0.4f);
+  glViewport(1, 2, 3, 4);
+  glEnable(GL_CULL_FACE);
+  render(mesh, bindPoses);
+  GLfloat clear[4] = {};
+  glGetFloatv(GL_COLOR_CLEAR_VALUE, clear);
+  EXPECT_FLOAT_EQ(clear[2], 0.3f);
+  GLint viewport[4] = {};
+  glGetIntegerv(GL_VIEWPORT, viewport);
+  EXPECT_EQ(viewport[2], 3);
+  EXPECT_TRUE(glIsEnabled(GL_CULL_FACE));
+  GLint framebuffer = -1;
+  glGetIntegerv(GL_FRAMEBUFFER_BINDING, &framebuffer);
+  EXPECT_EQ(framebuffer, 0);
+  EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));
+}
+
+TEST_F(PreviewTube, RejectsBadSizesAndInputs) {
+  for (const auto& [w, h] : {std::make_pair(15, 64), std::make_pair(64, 15), std::make_pair(8193, 64),
+                             std::make_pair(64, 8193), std::make_pair(-1, 64)}) {
+    EXPECT_THROW(renderPreviewPixels(mesh, skeleton, bindPoses, weights, PreviewOptions{w, h}),
+                 std::invalid_argument)
+        << w << "x" << h;
+  }
+  const std::vector<Mat4> tooFew(bindPoses.begin(), bindPoses.end() - 1);
+  EXPECT_THROW(render(mesh, tooFew), std::invalid_argument);
+}
+
+TEST(PreviewWithoutContext, ThrowsRuntimeError) {
+  Skeleton skeleton;
+  skeleton.joints = {{"root", -1, translate(0, 0, 0)}};
+  EXPECT_THROW(renderPreviewPixels(SurfaceMesh(), skeleton, {skeleton.joints[0].bindPose}, VertexWeights(),
+                                   PreviewOptions()),
+               std::runtime_error);
+}
+
+}  // namespace

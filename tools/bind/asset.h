@@ -1,0 +1,61 @@
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+// What the binding tool carries between its stages: the surface as the file had it, the skeleton in the
+// same space, and the weights the binding gave each vertex.
+namespace tessik::bind {
+
+using Vec3f = std::array<float, 3>;
+
+// Sixteen doubles, row by row, applied to column vectors (p' = M p): translation in elements 3, 7 and 11.
+// This is the layout ITransformHierarchy::addNode takes.
+using Mat4 = std::array<double, 16>;
+
+Mat4 identity();
+Mat4 multiply(const Mat4& a, const Mat4& b);
+// General inverse; throws std::runtime_error for a singular matrix.
+Mat4 inverse(const Mat4& m);
+Vec3f transformPoint(const Mat4& m, const Vec3f& p);
+// Rotation and scale only, for normals of rigid or uniformly scaled transforms.
+Vec3f transformVector(const Mat4& m, const Vec3f& v);
+inline Vec3f translationOf(const Mat4& m) {
+  return {static_cast<float>(m[3]), static_cast<float>(m[7]), static_cast<float>(m[11])};
+}
+
+struct Joint {
+  std::string name;
+  int parent = -1;  // index into Skeleton::joints, always smaller than this joint's own; -1 for a root
+  Mat4 bindPose{};  // the joint's frame in mesh space at bind time
+};
+
+struct Skeleton {
+  std::vector<Joint> joints;  // parents come before their children
+};
+
+struct SurfaceMesh {
+  std::vector<Vec3f> positions;
+  std::vector<Vec3f> normals;  // empty, or one per position
+  std::vector<std::array<std::uint32_t, 3>> triangles;
+};
+
+struct Influence {
+  std::uint32_t joint = 0;  // index into Skeleton::joints
+  float weight = 0.0f;
+};
+
+// Compressed rows: the influences of vertex v are influences[offsets[v]] .. influences[offsets[v + 1] - 1],
+// sorted by decreasing weight. A vertex may have none.
+struct VertexWeights {
+  std::vector<std::uint32_t> offsets{0};
+  std::vector<Influence> influences;
+
+  std::size_t numVertices() const { return offsets.size() - 1; }
+  std::uint32_t begin(std::size_t v) const { return offsets[v]; }
+  std::uint32_t end(std::size_t v) const { return offsets[v + 1]; }
+};
+
+}  // namespace tessik::bind

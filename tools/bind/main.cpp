@@ -1,0 +1,86 @@
+// tessik-bind: binds a mesh to its skeleton and writes the skinned asset, a weight table and a picture.
+
+#include <atomic>
+#include <csignal>
+#include <iostream>
+#include <stdexcept>
+
+#include <CLI/CLI.hpp>
+
+#include "bind_tool.h"
+#include "terminal_progress.h"
+
+namespace {
+
+std::atomic<bool> g_cancel{false};
+static_assert(std::atomic<bool>::is_always_lock_free, "the signal handler may only touch lock-free atomics");
+
+extern "C" void onInterrupt(int) { g_cancel.store(true); }
+
+void installInterruptHandler() {
+  struct sigaction action {};
+  action.sa_handler = onInterrupt;
+  sigemptyset(&action.sa_mask);
+  // A second Ctrl-C ends the process at once, for a user who will not wait for the binding to wind down.
+  action.sa_flags = SA_RESETHAND;
+  sigaction(SIGINT, &action, nullptr);
+  sigaction(SIGTERM, &action, nullptr);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  using tessik::bind::BindMethod;
+  tessik::bind::ToolOptions options;
+  std::vector<std::string> poses;
+  std::string method = "geodesic";
+
+  CLI::App app{
+      "Binds a mesh to its skeleton and writes it as a skinned glTF asset.\n"
+      "Reads what assimp reads (glTF/GLB, FBX, COLLADA, X, SMD, IQM, MS3D, OBJ, PLY, STL, ...). With no "
+      "INPUT it\n"
+      "binds a built-in character and writes out/character.glb and out/character.png with its left arm bent.",
+      "tessik-bind"};
+  app.add_option("input", options.input, "mesh with its skeleton (or with --skeleton for one without)");
+  app.add_option("-o,--output", options.outputPath, "skinned asset to write: .glb or .gltf");
+  app.add_option("--skeleton", options.skeletonPath,
+                 "bones as JSON, for meshes without a skeleton (see README)");
+  app.add_option("--method", method, "binding method")
+      ->check(CLI::IsMember({"geodesic", "heatmap"}))
+      ->capture_default_str();
+  app.add_option("--resolution", options.settings.resolution,
+                 "voxels along the longest side (geodesic method)")
+      ->check(CLI::Range(8, 1024))
+      ->capture_default_str();
+  app.add_option("--falloff", options.settings.falloff, "0 soft to 1 sharp transitions between bones")
+      ->check(CLI::Range(0.0f, 1.0f))
+      ->capture_default_str();
+  app.add_option("--max-influences", options.settings.maxInfluences,
+                 "bones kept per vertex, strongest first; 0 keeps all")
+      ->check(CLI::Range(0u, 64u))
+      ->capture_default_str();
+  app.add_flag(
+      "--refine-interior", options.settings.refineInterior,
+      "voxelise the inside at full resolution too (geodesic method; slower, for thin or nested parts)");
+  app.add_option("--csv", options.csvPath, "also write vertex,bone,weight rows");
+  app.add_option("--preview", options.previewPath, "also draw the bound mesh, coloured by bone, into a PNG");
+  app.add_option("--preview-size", options.previewSize, "preview width and height in pixels")
+      ->check(CLI::Range(16, 8192))
+      ->capture_default_str();
+  app.add_option("--pose", poses,
+                 "BONE=RX,RY,RZ: turn a bone (degrees, about its own axes) before the preview")
+      ->take_all();
+  CLI11_PARSE(app, argc, argv);
+
+  options.settings.method = method == "heatmap" ? BindMethod::heatmap : BindMethod::geodesic;
+  try {
+    for (const std::string& p : poses) options.pose.push_back(tessik::bind::parseJointRotation(p));
+  } catch (const std::invalid_argument& e) {
+    std::cerr << "tessik-bind: " << e.what() << "\n";
+    return tessik::bind::kExitUsage;
+  }
+
+  installInterruptHandler();
+  tessik::bind::TerminalProgress progress(stderr, &g_cancel);
+  return tessik::bind::runBindTool(options, progress, &g_cancel, std::cout, std::cerr);
+}

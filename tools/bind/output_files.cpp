@@ -1,0 +1,61 @@
+#include "output_files.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+#include <stdexcept>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace tessik::bind {
+namespace {
+
+mode_t processUmask() {
+  const mode_t mask = umask(0);
+  umask(mask);
+  return mask;
+}
+
+}  // namespace
+
+PendingOutputs::~PendingOutputs() { discard(); }
+
+std::string PendingOutputs::stage(const std::string& destination) {
+  namespace fs = std::filesystem;
+  const fs::path dest(destination);
+  std::error_code ec;
+  if (fs::is_directory(dest, ec))
+    throw std::runtime_error("cannot write '" + destination + "': it is a directory");
+  const fs::path folder = dest.parent_path().empty() ? fs::path(".") : dest.parent_path();
+  const std::string ext = dest.extension().string();
+  std::string pattern = (folder / ("." + dest.stem().string() + ".tmp-XXXXXX" + ext)).string();
+  const int fd = mkstemps(pattern.data(), static_cast<int>(ext.size()));
+  if (fd < 0) throw std::runtime_error("cannot write '" + destination + "': " + std::strerror(errno));
+  // mkstemps makes the file private; the result should get the permissions any new file would.
+  fchmod(fd, 0666 & ~processUmask());
+  close(fd);
+  entries_.push_back({pattern, destination});
+  return pattern;
+}
+
+void PendingOutputs::commit() {
+  while (!entries_.empty()) {
+    const Entry e = entries_.front();
+    if (std::rename(e.temporary.c_str(), e.destination.c_str()) != 0) {
+      const std::string why = std::strerror(errno);
+      discard();
+      throw std::runtime_error("cannot write '" + e.destination + "': " + why);
+    }
+    entries_.erase(entries_.begin());
+  }
+}
+
+void PendingOutputs::discard() noexcept {
+  for (const Entry& e : entries_) std::remove(e.temporary.c_str());
+  entries_.clear();
+}
+
+}  // namespace tessik::bind

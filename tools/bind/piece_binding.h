@@ -1,0 +1,34 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <vector>
+
+#include <tessik/geombind.h>
+
+#include "asset.h"
+
+namespace tessik::bind {
+
+struct PieceBinding {
+  VertexWeights weights;          // no vertices when no piece could be bound, or on cancel
+  std::size_t unboundPieces = 0;  // pieces that failed even alone, or had no triangle
+};
+
+// Binds one group of whole pieces; answers no vertices when the group cannot be bound.
+using GroupBinder = std::function<VertexWeights(const SurfaceMesh& group)>;
+
+// For a surface whose pieces cannot be bound all at once. The heat method fails the whole surface when
+// any one piece sees no bone (a shell of eyes or buttons outside the body, whose view of the bones the
+// body blocks). Splitting the pieces in halves until each group binds keeps every piece that can be
+// bound, in few runs when few pieces fail; a piece that fails even alone takes the weights of the nearest
+// bound vertex of another piece, which it usually rests on. `pieceOf` labels each vertex as labelPieces
+// does; the whole surface is taken to have failed already. Progress reports pieces done; cancellation
+// is read from it between groups.
+PieceBinding bindInGroups(const SurfaceMesh& mesh,
+                          const std::vector<std::uint32_t>& pieceOf,
+                          std::size_t pieces,
+                          const GroupBinder& bindGroup,
+                          TessikSDK::GeomBind::IProgress& progress);
+
+}  // namespace tessik::bind
