@@ -23,7 +23,9 @@ void TerminalProgress::begin(const char* title, int total, int start) {
   if (interactive_) {
     drawLocked(start);
   } else {
-    std::fprintf(stream_, "%s ...\n", title_.c_str());
+    // The library's titles already end in an ellipsis; a host's may not.
+    const bool ellipsis = title_.size() >= 3 && title_.compare(title_.size() - 3, 3, "...") == 0;
+    std::fprintf(stream_, "%s%s\n", title_.c_str(), ellipsis ? "" : " ...");
     std::fflush(stream_);
   }
 }
@@ -33,7 +35,6 @@ void TerminalProgress::end() {
   if (!open_) return;
   open_ = false;
   const double seconds = std::chrono::duration<double>(Clock::now() - began_).count();
-  phases_.emplace_back(title_, seconds);
   // The bar's line is overwritten by the phase's final line.
   std::fprintf(stream_, "%s%-40s %8.2f s\n", interactive_ ? "\r\033[K" : "", title_.c_str(), seconds);
   std::fflush(stream_);

@@ -5,8 +5,6 @@
 #include <cstdio>
 #include <mutex>
 #include <string>
-#include <utility>
-#include <vector>
 
 #include <tessik/geombind.h>
 
@@ -25,9 +23,6 @@ class TerminalProgress final : public TessikSDK::GeomBind::IProgress {
   bool update(int value) override;
   bool isCanceled() override;
 
-  // Each finished phase with its wall time in seconds, in order.
-  const std::vector<std::pair<std::string, double>>& phases() const { return phases_; }
-
  private:
   void drawLocked(int value);
 
@@ -42,7 +37,6 @@ class TerminalProgress final : public TessikSDK::GeomBind::IProgress {
   int lastPercent_ = -1;
   Clock::time_point began_;
   bool open_ = false;
-  std::vector<std::pair<std::string, double>> phases_;
 };
 
 }  // namespace tessik::bind
