@@ -189,6 +189,16 @@ INSTANTIATE_TEST_SUITE_P(
         BadRun{{"box.obj", "-o", "out.glb", "--falloff", "1.5"}, "--falloff"},
         BadRun{{"box.obj", "-o", "out.glb", "--method", "magic"}, "--method"}));
 
+TEST_F(CliTest, WithoutOpenGLItSaysWhatToInstall) {
+  // An EGL vendor list that names no driver leaves libglvnd with nothing to load, as on a bare server.
+  const ProcessResult r = runTool(TESSIK_BIND_EXE, {"-o", "c.glb"}, dir_.string(), {},
+                                  {"__EGL_VENDOR_LIBRARY_FILENAMES=/nonexistent/vendor.json"});
+  EXPECT_EQ(r.status, 1);
+  EXPECT_EQ(r.err.rfind("tessik-bind: no OpenGL context could be made", 0), 0u) << r.err;
+  EXPECT_NE(r.err.find("libegl-mesa0"), std::string::npos) << r.err;
+  EXPECT_EQ(files(), (std::set<std::string>{"bones.json", "box.obj"}));
+}
+
 TEST_F(CliTest, InterruptStopsTheRunAndWritesNothing) {
   // A fine grid keeps the binding busy long enough for the signal to land inside it.
   const ProcessResult r = run({"--resolution", "256", "-o", "c.glb", "--preview", "c.png"}, " ...\n");

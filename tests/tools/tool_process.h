@@ -18,11 +18,12 @@ struct ProcessResult {
 };
 
 // Runs the tool with `args` in `workDir`, collecting both streams. When `interruptAfter` is not empty,
-// sends SIGINT once that text has appeared on stderr.
+// sends SIGINT once that text has appeared on stderr. `environment` holds NAME=VALUE pairs to add.
 inline ProcessResult runTool(const std::string& exe,
                              const std::vector<std::string>& args,
                              const std::string& workDir,
-                             const std::string& interruptAfter = {}) {
+                             const std::string& interruptAfter = {},
+                             const std::vector<std::string>& environment = {}) {
   int outPipe[2], errPipe[2];
   if (pipe(outPipe) != 0 || pipe(errPipe) != 0) return {};
   const pid_t pid = fork();
@@ -32,6 +33,7 @@ inline ProcessResult runTool(const std::string& exe,
     close(outPipe[0]);
     close(errPipe[0]);
     if (chdir(workDir.c_str()) != 0) _exit(126);
+    for (const std::string& e : environment) putenv(const_cast<char*>(e.c_str()));
     std::vector<char*> argv{const_cast<char*>(exe.c_str())};
     for (const std::string& a : args) argv.push_back(const_cast<char*>(a.c_str()));
     argv.push_back(nullptr);

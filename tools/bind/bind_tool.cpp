@@ -119,7 +119,10 @@ std::optional<support::HeadlessGLContext> ensureGLContext() {
   std::string error;
   std::optional<support::HeadlessGLContext> context = support::HeadlessGLContext::create(&error);
   if (!context.has_value())
-    throw Failure(kExitFailed, "no OpenGL context could be made without a display. " + error);
+    throw Failure(kExitFailed,
+                  "no OpenGL context could be made without a display, and the binding library needs one for "
+                  "either method (--method heatmap included). Details:\n" +
+                      error);
   // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only that it
   // found no X display.
   const GLenum glew = glewInit();
@@ -184,11 +187,6 @@ int runBindTool(const ToolOptions& options,
     timed("import", [&] {
       if (o.input.empty()) {
         asset = defaultCharacter();
-        // The built-in run writes into out/ by default, which a fresh checkout does not have.
-        for (const std::string* path : {&o.outputPath, &o.previewPath, &o.csvPath}) {
-          const std::filesystem::path folder = std::filesystem::path(*path).parent_path();
-          if (!folder.empty()) std::filesystem::create_directories(folder);
-        }
       } else {
         asset = importAsset(o.input, !o.skeletonPath.empty());
         if (!o.skeletonPath.empty()) asset.skeleton = readSkeletonJson(o.skeletonPath);
@@ -244,6 +242,13 @@ int runBindTool(const ToolOptions& options,
     const VertexWeights weights = unweldWeights(weldedWeights, welded.weldOf);
 
     PendingOutputs files;
+    if (o.input.empty()) {
+      // The built-in run writes into out/ by default, which a fresh checkout does not have.
+      for (const std::string* path : {&o.outputPath, &o.previewPath, &o.csvPath}) {
+        const std::filesystem::path folder = std::filesystem::path(*path).parent_path();
+        if (!folder.empty()) std::filesystem::create_directories(folder);
+      }
+    }
     timed("write", [&] {
       if (!o.outputPath.empty())
         writeSkinnedGltf(files.stage(o.outputPath), mesh, skeleton, weights, endsWith(o.outputPath, ".glb"));
