@@ -1,6 +1,7 @@
 #include "bind_tool.h"
 
 #include <algorithm>
+#include <cctype>
 #include <chrono>
 #include <cmath>
 #include <filesystem>
