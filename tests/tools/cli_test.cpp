@@ -10,9 +10,8 @@
 #include <sstream>
 
 #include <gtest/gtest.h>
-#include <stb_image.h>
 
-#include "skinned_gltf_check.h"
+#include "tool_outputs.h"
 #include "tool_process.h"
 
 namespace tessik::test {
@@ -78,20 +77,6 @@ class CliTest : public ::testing::Test {
   fs::path dir_;
 };
 
-void expectConsistentSkin(const std::string& path, std::size_t joints) {
-  const SkinnedGltf g = readSkinnedGltf(path);
-  ASSERT_TRUE(g.error.empty()) << g.error;
-  EXPECT_EQ(g.jointNames.size(), joints);
-  for (std::size_t v = 0; v < g.vertices; ++v) {
-    float sum = 0.0f;
-    for (const auto& [joint, weight] : g.influences[v]) {
-      ASSERT_LT(joint, joints);
-      sum += weight;
-    }
-    ASSERT_NEAR(sum, 1.0f, 1e-5f) << path << " vertex " << v;
-  }
-}
-
 struct RealAsset {
   const char* file;
   const char* method;
@@ -107,15 +92,10 @@ TEST_P(RealAssetTest, BindsWritesAndDraws) {
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_NE(r.out.find(std::string("method      ") + a.method), std::string::npos) << r.out;
   expectConsistentSkin((dir_ / "out.glb").string(), a.bones);
-  int w = 0, h = 0, c = 0;
-  unsigned char* pixels = stbi_load((dir_ / "out.png").string().c_str(), &w, &h, &c, 3);
-  ASSERT_NE(pixels, nullptr);
-  std::set<int> colours;
-  for (int i = 0; i < w * h * 3; i += 3) colours.insert(pixels[i] << 16 | pixels[i + 1] << 8 | pixels[i + 2]);
-  stbi_image_free(pixels);
-  EXPECT_EQ(w, 160);
-  EXPECT_EQ(h, 160);
-  EXPECT_GT(colours.size(), 20u);
+  const Picture png = loadPng((dir_ / "out.png").string());
+  EXPECT_EQ(png.width, 160);
+  EXPECT_EQ(png.height, 160);
+  EXPECT_GT(png.distinctColours(), 20u);
   std::ifstream csv(dir_ / "w.csv");
   std::string header;
   std::getline(csv, header);
