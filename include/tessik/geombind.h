@@ -13,6 +13,12 @@
 /// must not run at the same time in one process (they share the stage timers).
 namespace TessikSDK::GeomBind {
 
+/// Whether bindings write to standard output: the phase lines of a binding run without a progress
+/// object, and the geodesic method's stage timing table. On unless a host turns it off; process-wide,
+/// read when a run prints, so set it before binding rather than during a run.
+TESSIK_API void setConsoleReports(bool enabled);
+TESSIK_API bool consoleReports();
+
 /// One influence of a bone on a vertex.
 struct BoneWeight {
   std::uint32_t boneIndex;  ///< node index in the hierarchy, in the order the nodes were added
@@ -52,7 +58,8 @@ class TESSIK_API ISparseVertexWeights {
 };
 
 /// The mesh to bind: vertices and triangles, appended in order. A binding moves the positions into a
-/// unit frame in place, so fill the mesh completely before binding it.
+/// unit frame in place, so fill the mesh completely before binding it; a later binding of the same mesh
+/// starts again from the positions as they were added, and so gives the same weights.
 class TESSIK_API IMesh {
  public:
   static IMesh* create();

@@ -37,7 +37,11 @@ BindInputs bindInputs(IMesh* mesh, ITransformHierarchy* hierarchy) {
   // Objects a host made itself rather than through the factories carry no data to bind.
   auto* meshImpl = dynamic_cast<MeshImpl*>(mesh);
   auto* hierarchyImpl = dynamic_cast<TransformHierarchyImpl*>(hierarchy);
-  if (meshImpl == nullptr || hierarchyImpl == nullptr || !isBindable(meshImpl->data)) return {};
+  if (meshImpl == nullptr || hierarchyImpl == nullptr) return {};
+  meshImpl->restoreAdded();
+  hierarchyImpl->restoreAdded();
+  if (!isBindable(meshImpl->data)) return {};
+  meshImpl->prepared = hierarchyImpl->prepared = true;
   return {&meshImpl->data, &hierarchyImpl->data};
 }
 

@@ -53,7 +53,19 @@ class MeshImpl : public IMesh {
   void addTriangle(unsigned int a, unsigned int b, unsigned int c) override;
   ~MeshImpl() override;
 
+  /// Puts back the vertices, triangles and box the host added, when a binding has prepared `data` since:
+  /// preparation rewrites them in place, and a second binding must start from what the host gave, not
+  /// from the unit frame of the first (whose padded box would shift every position again).
+  void restoreAdded();
+
   MeshData data;
+  /// Set by a binding once it has prepared `data`.
+  bool prepared = false;
+
+ private:
+  std::vector<VertexRecord> addedVertices_;
+  std::vector<TriangleRecord> addedTriangles_;
+  Collision::AABB addedBox_;
 };
 
 }  // namespace TessikSDK::GeomBind

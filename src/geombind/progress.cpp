@@ -1,9 +1,17 @@
 #include "geombind/progress.h"
 
+#include <atomic>
 #include <iostream>
 #include <utility>
 
 namespace TessikSDK::GeomBind {
+
+namespace {
+std::atomic<bool> g_consoleReports{true};
+}  // namespace
+
+void setConsoleReports(bool enabled) { g_consoleReports = enabled; }
+bool consoleReports() { return g_consoleReports; }
 
 IProgress::~IProgress() = default;
 
@@ -13,11 +21,13 @@ ProgressImpl::~ProgressImpl() = default;
 
 void ProgressImpl::begin(const char* title, int total, int start) {
   taskName = title != nullptr ? title : "";
-  std::cout << "Starting " << taskName << " ... ";
+  if (consoleReports()) std::cout << "Starting " << taskName << " ... ";
   setRange(total, start);
 }
 
-void ProgressImpl::end() { std::cout << "done " << std::endl; }
+void ProgressImpl::end() {
+  if (consoleReports()) std::cout << "done " << std::endl;
+}
 
 void ProgressImpl::setRange(int, int) {}
 

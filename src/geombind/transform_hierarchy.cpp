@@ -27,6 +27,7 @@ bool TransformHierarchyImpl::addNode(const char* name, const double* matrix, con
     for (int c = 0; c < 4; ++c) stored[4 * c + r] = matrix[4 * r + c];
   const auto index = static_cast<std::uint32_t>(data.transforms.size());
   data.transforms.push_back(stored);
+  addedTransforms_.push_back(stored);
   data.names.emplace_back(name);
   data.nameToIndex[name] = index;
   data.parentNames[name] = parentName != nullptr ? parentName : "";
@@ -38,6 +39,14 @@ void TransformHierarchyImpl::clear() {
   data.nameToIndex.clear();
   data.transforms.clear();
   data.parentNames.clear();
+  addedTransforms_.clear();
+  prepared = false;
+}
+
+void TransformHierarchyImpl::restoreAdded() {
+  if (!prepared) return;
+  data.transforms = addedTransforms_;
+  prepared = false;
 }
 
 }  // namespace TessikSDK::GeomBind

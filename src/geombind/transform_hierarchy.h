@@ -33,7 +33,16 @@ class TransformHierarchyImpl : public ITransformHierarchy {
   void clear() override;
   ~TransformHierarchyImpl() override;
 
+  /// Puts back the transforms the host added, when a binding has reduced them to joint positions in
+  /// its unit frame since (see MeshImpl::restoreAdded).
+  void restoreAdded();
+
   HierarchyData data;
+  /// Set by a binding once it has prepared `data`.
+  bool prepared = false;
+
+ private:
+  std::vector<Matrix4> addedTransforms_;
 };
 
 }  // namespace TessikSDK::GeomBind

@@ -8,6 +8,7 @@
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
 #include <GL/gl.h>
+#include <GL/glew.h>
 
 namespace tessik::support {
 namespace {
@@ -285,6 +286,24 @@ void HeadlessGLContext::release() noexcept {
     display_ = nullptr;
   }
   displayKind_.clear();
+}
+
+bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error) {
+  if (currentGLVersionString().empty()) {
+    made = HeadlessGLContext::create(error);
+    if (!made.has_value()) return false;
+  }
+  // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only that
+  // it found no X display.
+  const GLenum glew = glewInit();
+  if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
+    if (error != nullptr)
+      *error = std::string("OpenGL entry points could not be loaded: ") +
+               reinterpret_cast<const char*>(glewGetErrorString(glew));
+    made.reset();
+    return false;
+  }
+  return true;
 }
 
 }  // namespace tessik::support

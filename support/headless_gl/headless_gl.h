@@ -58,4 +58,10 @@ class HeadlessGLContext {
   std::string displayKind_;
 };
 
+// The one way hosts (tools, Python, tests, benchmarks) get a context to bind in: the context already
+// current on this thread if there is one, otherwise a headless one, made current and stored in `made`
+// (keep it alive while binding). GLEW's entry points are loaded either way. Answers false, with the
+// reason in `error` when it is not null, when neither works.
+bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error);
+
 }  // namespace tessik::support

@@ -21,6 +21,7 @@ struct ToolOptions {
   int previewSize = 800;
   BindSettings settings;
   std::vector<JointRotation> pose;  // applied before the preview is drawn
+  bool verbose = false;             // let the library print its own progress lines and stage table
 };
 
 // Exit statuses of the tool.
@@ -32,14 +33,15 @@ inline constexpr const char* kDefaultPreview = "out/character.png";
 // The built-in run bends the left elbow so that its picture shows how the binding deforms.
 std::vector<JointRotation> defaultCharacterPose();
 
-// Checks what option parsing cannot: extensions, ranges, and that there is something to write. Answers
-// the first fault as one line, or an empty string.
+// Checks what option parsing cannot: extensions, the binding options' ranges (the library's own limits),
+// and that there is something to write. Answers the first fault as one line, or an empty string.
 std::string validateOptions(const ToolOptions& options);
 
-// One whole run: read, weld, bind, write, draw. Uses the OpenGL context current on this thread, or makes
-// a headless one. Progress and cancellation go through `progress`; `cancel`, when set, is checked once
-// more before the files are put in place (a signal may arrive after the binding). The summary goes to
-// `out`, a failure to `err` as one line. Answers an ExitStatus; nothing is written unless it is kExitOk.
+// One whole run: read, bind (through the library's binding pipeline), write, draw, summarise. Uses the OpenGL
+// context current on this thread, or makes a headless one. Progress and cancellation go through `progress`;
+// `cancel`, when set, is checked once more before the files are put in place (a signal may arrive after the
+// binding). The summary goes to `out`, a failure to `err` as one line. Answers an ExitStatus; nothing is
+// written unless it is kExitOk.
 int runBindTool(const ToolOptions& options,
                 TessikSDK::GeomBind::IProgress& progress,
                 const std::atomic<bool>* cancel,

@@ -3,6 +3,7 @@
 #include <string>
 
 #include <tessik/geombind.h>
+#include <tessik/pipeline.h>
 
 #include "asset.h"
 
@@ -17,17 +18,22 @@ struct BindSettings {
   float falloff = 0.5f;
   unsigned maxInfluences = 4;  // 0 keeps every influence
   bool refineInterior = false;
+  bool leafTips = true;
 };
 
 const char* methodName(BindMethod method);
+TessikSDK::Pipeline::Options pipelineOptions(const BindSettings& settings);
 
-// Binds `mesh` to `skeleton` with the library, on the calling thread, whose OpenGL context must be
-// current. Influences name skeleton joints and come sorted by decreasing weight. The result has no
-// vertices when the binding failed or was cancelled. Throws std::runtime_error when the library cannot
-// start on the current context.
-VertexWeights bindSurface(const SurfaceMesh& mesh,
-                          const Skeleton& skeleton,
-                          const BindSettings& settings,
-                          TessikSDK::GeomBind::IProgress* progress);
+struct BoundAsset {
+  VertexWeights weights;  // one row per vertex of the mesh given, influences naming skeleton joints
+  TessikSDK::Pipeline::Report report;
+};
+
+// Binds `mesh` to `skeleton` through the library's binding pipeline, on the calling thread, whose OpenGL
+// context must be current. Throws TessikSDK::Pipeline::BindError when no weights come back.
+BoundAsset bindAsset(const SurfaceMesh& mesh,
+                     const Skeleton& skeleton,
+                     const BindSettings& settings,
+                     TessikSDK::GeomBind::IProgress* progress);
 
 }  // namespace tessik::bind

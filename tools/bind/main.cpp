@@ -50,18 +50,26 @@ int main(int argc, char** argv) {
       ->capture_default_str();
   app.add_option("--resolution", options.settings.resolution,
                  "voxels along the longest side (geodesic method)")
-      ->check(CLI::Range(8, 1024))
+      ->check(
+          CLI::Range(TessikSDK::Pipeline::Limits::minResolution, TessikSDK::Pipeline::Limits::maxResolution))
       ->capture_default_str();
   app.add_option("--falloff", options.settings.falloff, "0 soft to 1 sharp transitions between bones")
       ->check(CLI::Range(0.0f, 1.0f))
       ->capture_default_str();
   app.add_option("--max-influences", options.settings.maxInfluences,
                  "bones kept per vertex, strongest first; 0 keeps all")
-      ->check(CLI::Range(0u, 64u))
+      ->check(CLI::Range(0u, TessikSDK::Pipeline::Limits::maxInfluences))
       ->capture_default_str();
   app.add_flag(
       "--refine-interior", options.settings.refineInterior,
       "voxelise the inside at full resolution too (geodesic method; slower, for thin or nested parts)");
+  bool noLeafTips = false;
+  app.add_flag(
+      "--no-leaf-tips", noLeafTips,
+      "bind leaf bones (a head, a hand without fingers) by their joint alone, without a tip of their "
+      "own");
+  app.add_flag("--verbose", options.verbose,
+               "let the library print its own progress lines and stage timings");
   app.add_option("--csv", options.csvPath, "also write vertex,bone,weight rows");
   app.add_option("--preview", options.previewPath, "also draw the bound mesh, coloured by bone, into a PNG");
   app.add_option("--preview-size", options.previewSize, "preview width and height in pixels")
@@ -72,6 +80,7 @@ int main(int argc, char** argv) {
       ->take_all();
   CLI11_PARSE(app, argc, argv);
 
+  options.settings.leafTips = !noLeafTips;
   options.settings.method = method == "heatmap" ? BindMethod::heatmap : BindMethod::geodesic;
   try {
     for (const std::string& p : poses) options.pose.push_back(tessik::bind::parseJointRotation(p));

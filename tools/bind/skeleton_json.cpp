@@ -18,6 +18,7 @@ struct RawBone {
   std::string name;
   std::string parent;
   Mat4 frame{};
+  std::optional<Vec3f> tip;
 };
 
 [[noreturn]] void fail(const std::string& source, const std::string& what) {
@@ -67,6 +68,11 @@ RawBone readBone(const nlohmann::json& entry, std::size_t index, const std::stri
   } else {
     fail(source, label + " has neither matrix nor position");
   }
+  const auto tip = entry.find("tip");
+  if (tip != entry.end()) {
+    const std::vector<double> t = numbers(*tip, 3, source, label + ": tip");
+    bone.tip = Vec3f{static_cast<float>(t[0]), static_cast<float>(t[1]), static_cast<float>(t[2])};
+  }
   return bone;
 }
 
@@ -110,7 +116,7 @@ Skeleton parseSkeletonJson(const std::string& text, const std::string& source) {
       const int p = parentOf[i];
       if (p >= 0 && placedAs[p] < 0) continue;
       placedAs[i] = static_cast<int>(skeleton.joints.size());
-      skeleton.joints.push_back({raw[i].name, p >= 0 ? placedAs[p] : -1, raw[i].frame});
+      skeleton.joints.push_back({raw[i].name, p >= 0 ? placedAs[p] : -1, raw[i].frame, raw[i].tip});
       ++placed;
     }
     if (placed == before) {

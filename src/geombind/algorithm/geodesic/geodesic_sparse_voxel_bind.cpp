@@ -140,7 +140,7 @@ VertexWeights GeodesicSparseVoxelBind::bind(const MeshData& mesh,
     if (!progress.isCanceled()) truncateWeights(options->influenceLimit, weights);
   });
 
-  Diagnostics::report(std::cout, profiler) << std::endl << std::endl;
+  if (consoleReports()) Diagnostics::report(std::cout, profiler) << std::endl << std::endl;
   return weights;
 }
 

@@ -1,4 +1,4 @@
-#include "weld.h"
+#include "pipeline/weld.h"
 
 #include <algorithm>
 #include <climits>
@@ -8,7 +8,7 @@
 #include <numeric>
 #include <unordered_map>
 
-namespace tessik::bind {
+namespace TessikSDK::Pipeline {
 namespace {
 
 struct CellKey {
@@ -25,10 +25,10 @@ struct CellHash {
 
 }  // namespace
 
-float defaultWeldTolerance(const SurfaceMesh& mesh) {
+float defaultWeldTolerance(const Mesh& mesh) {
   if (mesh.positions.empty()) return 0.0f;
-  Vec3f lo = mesh.positions[0], hi = lo;
-  for (const Vec3f& p : mesh.positions)
+  std::array<float, 3> lo = mesh.positions[0], hi = lo;
+  for (const std::array<float, 3>& p : mesh.positions)
     for (int c = 0; c < 3; ++c) {
       lo[c] = std::min(lo[c], p[c]);
       hi[c] = std::max(hi[c], p[c]);
@@ -37,12 +37,12 @@ float defaultWeldTolerance(const SurfaceMesh& mesh) {
   return 1e-6f * std::sqrt(dx * dx + dy * dy + dz * dz);
 }
 
-WeldedMesh weldByPosition(const SurfaceMesh& mesh, float tolerance) {
+WeldedMesh weldByPosition(const Mesh& mesh, float tolerance) {
   WeldedMesh out;
   out.weldOf.resize(mesh.positions.size());
   // Cells as wide as the tolerance: a partner can only be in the vertex's own cell or a neighbouring one.
   const double cell = tolerance > 0.0f ? static_cast<double>(tolerance) : 0.0;
-  auto keyOf = [&](const Vec3f& p) {
+  auto keyOf = [&](const std::array<float, 3>& p) {
     if (cell == 0.0) {
       // Exact matching: the bit patterns are the key (with -0 folded onto +0).
       auto bits = [](float f) {
@@ -61,7 +61,7 @@ WeldedMesh weldByPosition(const SurfaceMesh& mesh, float tolerance) {
   cells.reserve(mesh.positions.size());
   const int reach = cell == 0.0 ? 0 : 1;
   for (std::size_t v = 0; v < mesh.positions.size(); ++v) {
-    const Vec3f& p = mesh.positions[v];
+    const std::array<float, 3>& p = mesh.positions[v];
     const CellKey key = keyOf(p);
     std::int64_t found = -1;
     for (int dx = -reach; dx <= reach && found < 0; ++dx)
@@ -70,7 +70,7 @@ WeldedMesh weldByPosition(const SurfaceMesh& mesh, float tolerance) {
           const auto it = cells.find({key.x + dx, key.y + dy, key.z + dz});
           if (it == cells.end()) continue;
           for (std::uint32_t w : it->second) {
-            const Vec3f& q = out.mesh.positions[w];
+            const std::array<float, 3>& q = out.mesh.positions[w];
             if (std::fabs(q[0] - p[0]) <= tolerance && std::fabs(q[1] - p[1]) <= tolerance &&
                 std::fabs(q[2] - p[2]) <= tolerance) {
               found = w;
@@ -93,7 +93,7 @@ WeldedMesh weldByPosition(const SurfaceMesh& mesh, float tolerance) {
   return out;
 }
 
-std::size_t labelPieces(const SurfaceMesh& mesh, std::vector<std::uint32_t>& pieceOf) {
+std::size_t labelPieces(const Mesh& mesh, std::vector<std::uint32_t>& pieceOf) {
   std::vector<std::uint32_t> root(mesh.positions.size());
   std::iota(root.begin(), root.end(), 0u);
   auto find = [&](std::uint32_t v) {
@@ -117,7 +117,7 @@ std::size_t labelPieces(const SurfaceMesh& mesh, std::vector<std::uint32_t>& pie
   return pieces;
 }
 
-std::size_t orientPiecesOutward(SurfaceMesh& mesh) {
+std::size_t orientPiecesOutward(Mesh& mesh) {
   std::vector<std::uint32_t> pieceOf;
   const std::size_t pieces = labelPieces(mesh, pieceOf);
   std::vector<std::array<double, 3>> centre(pieces, {0.0, 0.0, 0.0});
@@ -146,8 +146,8 @@ std::size_t orientPiecesOutward(SurfaceMesh& mesh) {
   return flipped;
 }
 
-VertexWeights unweldWeights(const VertexWeights& welded, const std::vector<std::uint32_t>& weldOf) {
-  VertexWeights out;
+Weights unweldWeights(const Weights& welded, const std::vector<std::uint32_t>& weldOf) {
+  Weights out;
   out.offsets.reserve(weldOf.size() + 1);
   for (std::uint32_t w : weldOf) {
     if (w < welded.numVertices())
@@ -158,4 +158,4 @@ VertexWeights unweldWeights(const VertexWeights& welded, const std::vector<std::
   return out;
 }
 
-}  // namespace tessik::bind
+}  // namespace TessikSDK::Pipeline

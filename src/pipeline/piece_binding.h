@@ -4,19 +4,18 @@
 #include <functional>
 #include <vector>
 
+#include "tessik/pipeline.h"
 #include <tessik/geombind.h>
 
-#include "asset.h"
-
-namespace tessik::bind {
+namespace TessikSDK::Pipeline {
 
 struct PieceBinding {
-  VertexWeights weights;          // no vertices when no piece could be bound, or on cancel
+  Weights weights;                // no vertices when no piece could be bound, or on cancel
   std::size_t unboundPieces = 0;  // pieces that failed even alone, or had no triangle
 };
 
 // Binds one group of whole pieces; answers no vertices when the group cannot be bound.
-using GroupBinder = std::function<VertexWeights(const SurfaceMesh& group)>;
+using GroupBinder = std::function<Weights(const Mesh& group)>;
 
 // For a surface whose pieces cannot be bound all at once. The heat method fails the whole surface when
 // any one piece sees no bone (a shell of eyes or buttons outside the body, whose view of the bones the
@@ -25,10 +24,10 @@ using GroupBinder = std::function<VertexWeights(const SurfaceMesh& group)>;
 // bound vertex of another piece, which it usually rests on. `pieceOf` labels each vertex as labelPieces
 // does; the whole surface is taken to have failed already. Progress reports pieces done; cancellation
 // is read from it between groups.
-PieceBinding bindInGroups(const SurfaceMesh& mesh,
+PieceBinding bindInGroups(const Mesh& mesh,
                           const std::vector<std::uint32_t>& pieceOf,
                           std::size_t pieces,
                           const GroupBinder& bindGroup,
                           TessikSDK::GeomBind::IProgress& progress);
 
-}  // namespace tessik::bind
+}  // namespace TessikSDK::Pipeline

@@ -1,16 +1,16 @@
-#include "piece_binding.h"
+#include "pipeline/piece_binding.h"
 
 #include <limits>
 #include <utility>
 
-namespace tessik::bind {
+namespace TessikSDK::Pipeline {
 namespace {
 
 namespace gb = TessikSDK::GeomBind;
 
 class PieceBinder {
  public:
-  PieceBinder(const SurfaceMesh& mesh,
+  PieceBinder(const Mesh& mesh,
               const std::vector<std::uint32_t>& pieceOf,
               std::size_t pieces,
               const GroupBinder& bindGroup,
@@ -72,7 +72,7 @@ class PieceBinder {
   }
 
   bool bind(const std::vector<std::uint32_t>& pieces, std::size_t first, std::size_t last) {
-    SurfaceMesh group;
+    Mesh group;
     for (std::size_t i = first; i < last; ++i) {
       for (std::uint32_t v : vertices_[pieces[i]]) {
         local_[v] = static_cast<std::uint32_t>(group.positions.size());
@@ -81,7 +81,7 @@ class PieceBinder {
       for (const auto& t : triangles_[pieces[i]])
         group.triangles.push_back({local_[t[0]], local_[t[1]], local_[t[2]]});
     }
-    const VertexWeights w = bindGroup_(group);
+    const Weights w = bindGroup_(group);
     if (w.numVertices() == 0) return false;
     for (std::size_t i = first; i < last; ++i)
       for (std::uint32_t v : vertices_[pieces[i]]) {
@@ -101,8 +101,8 @@ class PieceBinder {
       std::uint32_t best = donors.front();
       float bestDistance = std::numeric_limits<float>::infinity();
       for (std::uint32_t d : donors) {
-        const Vec3f& a = mesh_.positions[d];
-        const Vec3f& b = mesh_.positions[v];
+        const std::array<float, 3>& a = mesh_.positions[d];
+        const std::array<float, 3>& b = mesh_.positions[v];
         const float distance =
             (a[0] - b[0]) * (a[0] - b[0]) + (a[1] - b[1]) * (a[1] - b[1]) + (a[2] - b[2]) * (a[2] - b[2]);
         if (distance < bestDistance) {
@@ -114,7 +114,7 @@ class PieceBinder {
     }
   }
 
-  const SurfaceMesh& mesh_;
+  const Mesh& mesh_;
   const GroupBinder& bindGroup_;
   gb::IProgress& progress_;
   std::vector<std::vector<std::uint32_t>> vertices_;
@@ -128,7 +128,7 @@ class PieceBinder {
 
 }  // namespace
 
-PieceBinding bindInGroups(const SurfaceMesh& mesh,
+PieceBinding bindInGroups(const Mesh& mesh,
                           const std::vector<std::uint32_t>& pieceOf,
                           std::size_t pieces,
                           const GroupBinder& bindGroup,
@@ -136,4 +136,4 @@ PieceBinding bindInGroups(const SurfaceMesh& mesh,
   return PieceBinder(mesh, pieceOf, pieces, bindGroup, progress).run();
 }
 
-}  // namespace tessik::bind
+}  // namespace TessikSDK::Pipeline

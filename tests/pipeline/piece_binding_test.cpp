@@ -1,10 +1,10 @@
-#include "piece_binding.h"
+#include "pipeline/piece_binding.h"
 
 #include <gtest/gtest.h>
 
-#include "weld.h"
+#include "pipeline/weld.h"
 
-namespace tessik::bind {
+namespace TessikSDK::Pipeline {
 namespace {
 
 namespace gb = TessikSDK::GeomBind;
@@ -40,12 +40,12 @@ class PieceBindingTest : public ::testing::Test {
   // A group fails when it holds a vertex past x = 4 (a piece that sees no bone); otherwise each vertex
   // goes to joint 0 left of the origin and joint 1 right of it.
   GroupBinder fake() {
-    return [this](const SurfaceMesh& group) {
+    return [this](const Mesh& group) {
       ++calls_;
-      VertexWeights w;
-      for (const Vec3f& p : group.positions)
-        if (p[0] > 4.0f) return VertexWeights{};
-      for (const Vec3f& p : group.positions) {
+      Weights w;
+      for (const std::array<float, 3>& p : group.positions)
+        if (p[0] > 4.0f) return Weights{};
+      for (const std::array<float, 3>& p : group.positions) {
         w.influences.push_back({p[0] < 0.0f ? 0u : 1u, 1.0f});
         w.offsets.push_back(static_cast<std::uint32_t>(w.influences.size()));
       }
@@ -53,7 +53,7 @@ class PieceBindingTest : public ::testing::Test {
     };
   }
 
-  SurfaceMesh mesh_;
+  Mesh mesh_;
   std::vector<std::uint32_t> pieceOf_;
   std::size_t pieces_ = 0;
   int calls_ = 0;
@@ -68,7 +68,7 @@ TEST_F(PieceBindingTest, FailingPieceBorrowsFromItsNearestBoundNeighbour) {
   for (std::size_t v = 0; v < mesh_.positions.size(); ++v) {
     ASSERT_EQ(r.weights.end(v) - r.weights.begin(v), 1u) << v;
     // The piece at x = 5 lies nearest the one at x = 2, which joint 1 rules.
-    EXPECT_EQ(r.weights.influences[r.weights.begin(v)].joint, mesh_.positions[v][0] < 0.0f ? 0u : 1u) << v;
+    EXPECT_EQ(r.weights.influences[r.weights.begin(v)].bone, mesh_.positions[v][0] < 0.0f ? 0u : 1u) << v;
   }
   // Halving: {-1, 1} binds at once, {5, -3, 2} fails, then {5} fails and {-3, 2} binds.
   EXPECT_EQ(calls_, 4);
@@ -77,7 +77,7 @@ TEST_F(PieceBindingTest, FailingPieceBorrowsFromItsNearestBoundNeighbour) {
 TEST_F(PieceBindingTest, NothingComesBackWhenEveryPieceFailsOrTheRunIsCancelled) {
   CancelAfter never(1 << 30);
   const PieceBinding none = bindInGroups(
-      mesh_, pieceOf_, pieces_, [](const SurfaceMesh&) { return VertexWeights{}; }, never);
+      mesh_, pieceOf_, pieces_, [](const Mesh&) { return Weights{}; }, never);
   EXPECT_EQ(none.unboundPieces, pieces_);
   EXPECT_EQ(none.weights.numVertices(), 0u);
 
@@ -87,4 +87,4 @@ TEST_F(PieceBindingTest, NothingComesBackWhenEveryPieceFailsOrTheRunIsCancelled)
 }
 
 }  // namespace
-}  // namespace tessik::bind
+}  // namespace TessikSDK::Pipeline

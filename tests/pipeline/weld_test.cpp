@@ -1,17 +1,17 @@
-#include "weld.h"
+#include "pipeline/weld.h"
 
 #include <algorithm>
 #include <map>
 
 #include <gtest/gtest.h>
 
-namespace tessik::bind {
+namespace TessikSDK::Pipeline {
 namespace {
 
 // A unit cube as importers deliver it: four vertices of its own per face, so that each face can carry
 // its own normal.
-SurfaceMesh splitCube() {
-  SurfaceMesh m;
+Mesh splitCube() {
+  Mesh m;
   const int faces[6][4][3] = {
       {{0, 0, 0}, {0, 1, 0}, {1, 1, 0}, {1, 0, 0}}, {{0, 0, 1}, {1, 0, 1}, {1, 1, 1}, {0, 1, 1}},
       {{0, 0, 0}, {1, 0, 0}, {1, 0, 1}, {0, 0, 1}}, {{0, 1, 0}, {0, 1, 1}, {1, 1, 1}, {1, 1, 0}},
@@ -26,7 +26,7 @@ SurfaceMesh splitCube() {
 }
 
 TEST(WeldTest, SeamSplitCubeBecomesOneClosedSurface) {
-  const SurfaceMesh cube = splitCube();
+  const Mesh cube = splitCube();
   const WeldedMesh w = weldByPosition(cube, defaultWeldTolerance(cube));
   ASSERT_EQ(w.mesh.positions.size(), 8u);
   ASSERT_EQ(w.mesh.triangles.size(), 12u);
@@ -50,7 +50,7 @@ class WeldToleranceTest : public ::testing::TestWithParam<ToleranceCase> {};
 
 TEST_P(WeldToleranceTest, JoinsOnlyWithinTolerance) {
   const ToleranceCase c = GetParam();
-  SurfaceMesh m;
+  Mesh m;
   // The pair straddles a cell boundary of the search grid, where a lookup in one cell only would miss it.
   m.positions = {{1.0f, 2.0f, 3.0f}, {1.0f + c.offset, 2.0f - c.offset, 3.0f}, {5.0f, 5.0f, 5.0f}};
   const WeldedMesh w = weldByPosition(m, c.tolerance);
@@ -66,23 +66,23 @@ INSTANTIATE_TEST_SUITE_P(Offsets,
                                            ToleranceCase{1.1e-3f, 1e-3f, false}));
 
 TEST(WeldTest, CollapsedTrianglesAreDroppedAndWeightsFollowTheWeld) {
-  SurfaceMesh m;
+  Mesh m;
   m.positions = {{0, 0, 0}, {1, 0, 0}, {0, 1, 0}, {1, 0, 0}};
   m.triangles = {{0, 1, 2}, {0, 1, 3}, {3, 2, 0}};  // the second collapses onto the edge 0-1
   const WeldedMesh w = weldByPosition(m, 0.0f);
   ASSERT_EQ(w.mesh.triangles.size(), 2u);
   EXPECT_EQ(w.mesh.triangles[1], (std::array<std::uint32_t, 3>{1, 2, 0}));
 
-  VertexWeights welded;
+  Weights welded;
   welded.offsets = {0, 1, 3, 3};  // vertex 2 has none
   welded.influences = {{4, 1.0f}, {1, 0.75f}, {2, 0.25f}};
-  const VertexWeights out = unweldWeights(welded, w.weldOf);
+  const Weights out = unweldWeights(welded, w.weldOf);
   ASSERT_EQ(out.numVertices(), 4u);
   EXPECT_EQ(out.end(2) - out.begin(2), 0u);
   ASSERT_EQ(out.end(3) - out.begin(3), 2u);
-  EXPECT_EQ(out.influences[out.begin(3)].joint, 1u);
+  EXPECT_EQ(out.influences[out.begin(3)].bone, 1u);
   EXPECT_EQ(out.influences[out.begin(3) + 1].weight, 0.25f);
 }
 
 }  // namespace
-}  // namespace tessik::bind
+}  // namespace TessikSDK::Pipeline

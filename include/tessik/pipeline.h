@@ -1,0 +1,142 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <stdexcept>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include <tessik/export.h>
+#include <tessik/geombind.h>
+
+/// Binding a real asset in one call: the steps every host needs between its file or arrays and the
+/// binding methods of TessikSDK::GeomBind, so that the tool, the Python module and any C++ host bind
+/// the same input to the same weights.
+///
+/// A call checks the input, welds vertices split along seams, turns pieces wound inside out (for the
+/// binding only), adds a tip under every leaf bone so that a head or a hand moves as a whole, binds
+/// (piece by piece when the whole surface cannot be bound at once), gives vertices no bone reached the
+/// weights of their nearest neighbour or joint, folds the tips back into their leaves, and limits and
+/// normalises the influences. The answer is indexed by the caller's own vertices and bones.
+///
+/// Both methods need an OpenGL 2.1 context current on the calling thread (the binding context is made
+/// there); the pipeline makes none itself.
+namespace TessikSDK::Pipeline {
+
+/// Row by row, applied to column vectors (p' = M p): translation in elements 3, 7 and 11.
+using Matrix4x4 = std::array<double, 16>;
+
+struct Bone {
+  std::string name;             ///< non-empty and unique
+  int parent = -1;              ///< index into the bone list, -1 for a root; any order
+  Matrix4x4 bindPose{};         ///< the joint's frame in mesh space; its translation is the joint
+  bool hasTip = false;          ///< the skeleton itself says where this bone ends
+  std::array<double, 3> tip{};  ///< that end, in mesh space; used only for a leaf bone
+};
+
+struct Mesh {
+  std::vector<std::array<float, 3>> positions;
+  std::vector<std::array<std::uint32_t, 3>> triangles;
+};
+
+enum class Method { geodesic, heatmap };
+
+/// The accepted ranges, shared by every front end.
+struct Limits {
+  static constexpr int minResolution = 8;
+  static constexpr int maxResolution = 1024;  ///< the largest grid the geodesic smoothing is tuned for
+  static constexpr unsigned maxInfluences = 64;
+};
+
+struct Options {
+  Method method = Method::geodesic;
+  int resolution = 64;          ///< voxels along the longest side (geodesic)
+  float falloff = 0.5f;         ///< 0 soft to 1 sharp
+  unsigned maxInfluences = 4;   ///< 0 keeps every influence
+  bool refineInterior = false;  ///< geodesic: voxelise the inside at full resolution too
+  /// Give every leaf bone a virtual end so that it can own the part it carries, rather than tie with
+  /// its parent at its joint. The tip is the skeleton's own (Bone::hasTip) where it has one, otherwise
+  /// cast from the leaf joint away from its parent to just inside the surface. Tips never appear in
+  /// the result: their weights go to their leaf.
+  bool leafTips = true;
+};
+
+/// The first fault of `options` as one line naming the option, or an empty string.
+TESSIK_API std::string validateOptions(const Options& options);
+
+struct Influence {
+  std::uint32_t bone = 0;  ///< index into the caller's bone list
+  double weight = 0.0;
+};
+
+/// Compressed rows: the influences of vertex v are influences[offsets[v]] .. influences[offsets[v + 1] - 1],
+/// strongest first, summing to 1.
+struct Weights {
+  std::vector<std::uint32_t> offsets{0};
+  std::vector<Influence> influences;
+
+  std::size_t numVertices() const { return offsets.size() - 1; }
+  std::uint32_t begin(std::size_t v) const { return offsets[v]; }
+  std::uint32_t end(std::size_t v) const { return offsets[v + 1]; }
+};
+
+/// What a run did, for a host's summary.
+struct Report {
+  std::size_t weldedVertices = 0;
+  std::size_t pieces = 0;
+  std::size_t turnedPieces = 0;    ///< wound inside out, turned for binding
+  bool boundByPiece = false;       ///< the whole surface failed, so its pieces were bound in groups
+  std::size_t unboundPieces = 0;   ///< pieces that took their weights from the nearest bound vertex
+  std::size_t orphanVertices = 0;  ///< vertices no binding reached, given their nearest joint
+  std::size_t tipsFromSkeleton = 0;
+  std::size_t tipsCast = 0;
+  std::size_t leavesWithoutTip = 0;  ///< leaf joint outside the surface, or nowhere to cast to
+  std::size_t maxInfluences = 0;     ///< most influences on one vertex in the result
+  double meanInfluences = 0.0;
+  /// Every phase the binding announced (plus the pipeline's own), with its wall time in seconds.
+  std::vector<std::pair<std::string, double>> phases;
+};
+
+struct Result {
+  Weights weights;  ///< one row per caller vertex
+  Report report;
+};
+
+/// Why a run gave no weights.
+class TESSIK_API BindError : public std::runtime_error {
+ public:
+  enum class Kind {
+    invalidInput,  ///< the mesh, bones or options are unusable; the message says which and why
+    noOpenGL,      ///< no OpenGL 2.1 context is current on the calling thread
+    noWeights,     ///< the method reached no bone from any piece of the surface
+    cancelled,     ///< the progress object asked to stop
+  };
+  BindError(Kind kind, const std::string& message);
+  ~BindError() override;
+  Kind kind() const { return kind_; }
+
+ private:
+  Kind kind_;
+};
+
+/// Binds `mesh` to `bones`. `progress` may be null; when given it sees every phase and may cancel.
+/// Throws BindError (and std::bad_alloc); the mesh and bones are only read.
+TESSIK_API Result bindSkin(const Mesh& mesh,
+                           const std::vector<Bone>& bones,
+                           const Options& options,
+                           GeomBind::IProgress* progress = nullptr);
+
+/// A progress object that reports nothing and never cancels, for hosts that want the library quiet.
+class TESSIK_API NullProgress final : public GeomBind::IProgress {
+ public:
+  ~NullProgress() override;
+  void begin(const char* title, int total, int start) override;
+  void end() override;
+  void setRange(int total, int start) override;
+  bool update(int value) override;
+  bool isCanceled() override;
+};
+
+}  // namespace TessikSDK::Pipeline

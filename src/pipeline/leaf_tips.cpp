@@ -1,0 +1,118 @@
+#include "pipeline/leaf_tips.h"
+
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+namespace TessikSDK::Pipeline {
+namespace {
+
+using Vec3 = std::array<double, 3>;
+
+Vec3 sub(const Vec3& a, const Vec3& b) { return {a[0] - b[0], a[1] - b[1], a[2] - b[2]}; }
+double dot(const Vec3& a, const Vec3& b) { return a[0] * b[0] + a[1] * b[1] + a[2] * b[2]; }
+Vec3 cross(const Vec3& a, const Vec3& b) {
+  return {a[1] * b[2] - a[2] * b[1], a[2] * b[0] - a[0] * b[2], a[0] * b[1] - a[1] * b[0]};
+}
+double norm(const Vec3& a) { return std::sqrt(dot(a, a)); }
+Vec3 corner(const Mesh& mesh, std::uint32_t v) {
+  const auto& p = mesh.positions[v];
+  return {p[0], p[1], p[2]};
+}
+Vec3 jointOf(const Bone& bone) { return {bone.bindPose[3], bone.bindPose[7], bone.bindPose[11]}; }
+
+// Where the ray crosses a triangle, and whether it goes out through it (along the outward normal).
+struct Crossing {
+  double t;
+  bool leaving;
+};
+
+std::vector<Crossing> crossings(const Mesh& mesh, const Vec3& origin, const Vec3& direction) {
+  std::vector<Crossing> out;
+  for (const auto& tri : mesh.triangles) {
+    const Vec3 a = corner(mesh, tri[0]);
+    const Vec3 e1 = sub(corner(mesh, tri[1]), a), e2 = sub(corner(mesh, tri[2]), a);
+    const Vec3 p = cross(direction, e2);
+    const double det = dot(e1, p);
+    if (det == 0.0) continue;  // the ray runs in the triangle's plane
+    const Vec3 s = sub(origin, a);
+    const double u = dot(s, p) / det;
+    if (u < 0.0 || u > 1.0) continue;
+    const Vec3 q = cross(s, e1);
+    const double v = dot(direction, q) / det;
+    if (v < 0.0 || u + v > 1.0) continue;
+    const double t = dot(e2, q) / det;
+    // det = -direction . (e1 x e2): negative when the ray goes out through the triangle's front.
+    if (t > 0.0) out.push_back({t, det < 0.0});
+  }
+  std::sort(out.begin(), out.end(), [](const Crossing& x, const Crossing& y) { return x.t < y.t; });
+  // A ray through an edge or a corner hits every triangle that shares it, but crosses the surface once.
+  std::vector<Crossing> distinct;
+  for (const Crossing& c : out)
+    if (distinct.empty() || distinct.back().leaving != c.leaving ||
+        c.t - distinct.back().t > 1e-9 * (1.0 + c.t))
+      distinct.push_back(c);
+  return distinct;
+}
+
+// How far along `direction` (unit) the ray from `origin`, which starts `depth` surfaces deep, first
+// comes out of all of them; 0 when it never does.
+double exitDistance(const Mesh& mesh, const Vec3& origin, const Vec3& direction, int depth) {
+  for (const Crossing& c : crossings(mesh, origin, direction)) {
+    depth += c.leaving ? -1 : 1;
+    if (depth <= 0) return c.t;
+  }
+  return 0.0;
+}
+
+}  // namespace
+
+double windingNumber(const Mesh& mesh, const Vec3& point) {
+  // Each triangle adds the solid angle it spans as seen from the point (van Oosterom and Strackee).
+  double total = 0.0;
+  for (const auto& tri : mesh.triangles) {
+    const Vec3 a = sub(corner(mesh, tri[0]), point), b = sub(corner(mesh, tri[1]), point),
+               c = sub(corner(mesh, tri[2]), point);
+    const double la = norm(a), lb = norm(b), lc = norm(c);
+    const double numerator = dot(a, cross(b, c));
+    const double denominator = la * lb * lc + dot(a, b) * lc + dot(b, c) * la + dot(c, a) * lb;
+    total += 2.0 * std::atan2(numerator, denominator);
+  }
+  return total / (4.0 * M_PI);
+}
+
+TipPlacement placeLeafTips(const Mesh& mesh, const std::vector<Bone>& bones) {
+  TipPlacement placement;
+  std::vector<bool> hasChild(bones.size(), false);
+  for (const Bone& bone : bones)
+    if (bone.parent >= 0) hasChild[static_cast<std::size_t>(bone.parent)] = true;
+  for (std::uint32_t b = 0; b < bones.size(); ++b) {
+    if (hasChild[b]) continue;
+    const Bone& leaf = bones[b];
+    const Vec3 joint = jointOf(leaf);
+    if (leaf.hasTip && sub(leaf.tip, joint) != Vec3{0.0, 0.0, 0.0}) {
+      placement.tips.push_back({b, leaf.tip, true});
+      continue;
+    }
+    ++placement.leavesWithoutTip;
+    if (leaf.parent < 0) continue;
+    const Vec3 along = sub(joint, jointOf(bones[static_cast<std::size_t>(leaf.parent)]));
+    const double parentLength = norm(along);
+    if (parentLength == 0.0) continue;
+    const Vec3 direction = {along[0] / parentLength, along[1] / parentLength, along[2] / parentLength};
+    // A joint inside a body wrapped in clothing is inside both: the ray has to come out of each.
+    const double winding = windingNumber(mesh, joint);
+    if (winding < 0.5) continue;
+    const double exit = exitDistance(mesh, joint, direction, static_cast<int>(std::lround(winding)));
+    const double length = std::min(kTipReach * exit, kTipLengthCap * parentLength);
+    if (!(length > 0.0)) continue;
+    --placement.leavesWithoutTip;
+    placement.tips.push_back({b,
+                              {joint[0] + length * direction[0], joint[1] + length * direction[1],
+                               joint[2] + length * direction[2]},
+                              false});
+  }
+  return placement;
+}
+
+}  // namespace TessikSDK::Pipeline

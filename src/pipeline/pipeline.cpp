@@ -1,0 +1,236 @@
+#include "tessik/pipeline.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cmath>
+#include <memory>
+#include <set>
+#include <string>
+#include <utility>
+
+#include "pipeline/influences.h"
+#include "pipeline/input_check.h"
+#include "pipeline/leaf_tips.h"
+#include "pipeline/piece_binding.h"
+#include "pipeline/weld.h"
+
+namespace TessikSDK::Pipeline {
+namespace {
+
+namespace gb = TessikSDK::GeomBind;
+using Clock = std::chrono::steady_clock;
+
+template <typename T>
+struct Disposer {
+  void operator()(T* p) const { T::dispose(p); }
+};
+template <typename T>
+using Owned = std::unique_ptr<T, Disposer<T>>;
+
+// Passes everything on to the host and keeps each phase's wall time for the report.
+class PhaseClock final : public gb::IProgress {
+ public:
+  explicit PhaseClock(gb::IProgress& inner) : inner_(inner) {}
+  void begin(const char* title, int total, int start) override {
+    title_ = title != nullptr ? title : "";
+    began_ = Clock::now();
+    inner_.begin(title, total, start);
+  }
+  void end() override {
+    phases.emplace_back(title_, std::chrono::duration<double>(Clock::now() - began_).count());
+    inner_.end();
+  }
+  void setRange(int total, int start) override { inner_.setRange(total, start); }
+  bool update(int value) override { return inner_.update(value); }
+  bool isCanceled() override { return inner_.isCanceled(); }
+
+  std::vector<std::pair<std::string, double>> phases;
+
+ private:
+  gb::IProgress& inner_;
+  std::string title_;
+  Clock::time_point began_;
+};
+
+// Forwards only cancellation, so that binding many groups one by one does not flood the host's display.
+class CancelOnly final : public gb::IProgress {
+ public:
+  explicit CancelOnly(gb::IProgress& inner) : inner_(inner) {}
+  void begin(const char*, int, int) override {}
+  void end() override {}
+  void setRange(int, int) override {}
+  bool update(int) override { return false; }
+  bool isCanceled() override { return inner_.isCanceled(); }
+
+ private:
+  gb::IProgress& inner_;
+};
+
+// One node of the binding hierarchy: a caller's bone, or a leaf tip that stands for its leaf.
+struct Node {
+  std::string name;
+  std::string parent;
+  Matrix4x4 matrix;
+};
+
+std::vector<Node> bindingNodes(const std::vector<Bone>& bones,
+                               const std::vector<LeafTip>& tips,
+                               std::vector<std::uint32_t>& boneOfNode) {
+  std::vector<Node> nodes;
+  boneOfNode.clear();
+  for (std::uint32_t b = 0; b < bones.size(); ++b) {
+    const Bone& bone = bones[b];
+    nodes.push_back({bone.name,
+                     bone.parent >= 0 ? bones[static_cast<std::size_t>(bone.parent)].name : std::string(),
+                     bone.bindPose});
+    boneOfNode.push_back(b);
+  }
+  std::set<std::string> taken;
+  for (const Bone& bone : bones) taken.insert(bone.name);
+  for (const LeafTip& tip : tips) {
+    // Names only link tips to their leaves inside the binding; they must not collide with the caller's.
+    std::string name = bones[tip.leaf].name + " tip";
+    while (!taken.insert(name).second) name += "'";
+    const auto& p = tip.position;
+    nodes.push_back({name, bones[tip.leaf].name, {1, 0, 0, p[0], 0, 1, 0, p[1], 0, 0, 1, p[2], 0, 0, 0, 1}});
+    boneOfNode.push_back(tip.leaf);
+  }
+  return nodes;
+}
+
+// One run of the library's method on `mesh`; no vertices when it failed.
+Weights bindOnce(gb::IContext& context,
+                 const Mesh& mesh,
+                 const std::vector<Node>& nodes,
+                 const Options& options,
+                 unsigned influenceLimit,
+                 gb::IProgress& progress) {
+  const Owned<gb::IMesh> target(gb::IMesh::create());
+  const Owned<gb::ITransformHierarchy> hierarchy(gb::ITransformHierarchy::create());
+  for (const auto& p : mesh.positions) target->addVertex(p[0], p[1], p[2]);
+  for (const auto& t : mesh.triangles) target->addTriangle(t[0], t[1], t[2]);
+  for (const Node& n : nodes)
+    hierarchy->addNode(n.name.c_str(), n.matrix.data(), n.parent.empty() ? nullptr : n.parent.c_str());
+  gb::ISparseVertexWeights* result =
+      options.method == Method::geodesic
+          ? context.bindGeodesicSparseVoxel(target.get(), hierarchy.get(), &progress, options.falloff,
+                                            influenceLimit, options.resolution, options.refineInterior)
+          : context.bindHeatmap(target.get(), hierarchy.get(), &progress, options.falloff, influenceLimit);
+  Weights weights;
+  if (result->numVertices() != mesh.positions.size()) return weights;
+  weights.offsets.reserve(mesh.positions.size() + 1);
+  for (unsigned v = 0; v < mesh.positions.size(); ++v) {
+    for (unsigned i = 0; i < result->numWeights(v); ++i) {
+      const gb::BoneWeight w = result->getWeight(v, i);
+      if (w.weight > 0.0 && w.boneIndex < nodes.size()) weights.influences.push_back({w.boneIndex, w.weight});
+    }
+    weights.offsets.push_back(static_cast<std::uint32_t>(weights.influences.size()));
+  }
+  return weights;
+}
+
+}  // namespace
+
+BindError::BindError(Kind kind, const std::string& message) : std::runtime_error(message), kind_(kind) {}
+BindError::~BindError() = default;
+
+NullProgress::~NullProgress() = default;
+void NullProgress::begin(const char*, int, int) {}
+void NullProgress::end() {}
+void NullProgress::setRange(int, int) {}
+bool NullProgress::update(int) { return false; }
+bool NullProgress::isCanceled() { return false; }
+
+std::string validateOptions(const Options& o) {
+  if (o.method != Method::geodesic && o.method != Method::heatmap)
+    return "method must be geodesic or heatmap";
+  if (o.resolution < Limits::minResolution || o.resolution > Limits::maxResolution)
+    return "resolution must be between " + std::to_string(Limits::minResolution) + " and " +
+           std::to_string(Limits::maxResolution) + ", got " + std::to_string(o.resolution);
+  if (!(o.falloff >= 0.0f && o.falloff <= 1.0f))
+    return "falloff must be between 0 (soft) and 1 (sharp), got " + std::to_string(o.falloff);
+  if (o.maxInfluences > Limits::maxInfluences)
+    return "max influences must be between 0 (keep all) and " + std::to_string(Limits::maxInfluences) +
+           ", got " + std::to_string(o.maxInfluences);
+  return {};
+}
+
+Result bindSkin(const Mesh& mesh,
+                const std::vector<Bone>& bones,
+                const Options& options,
+                gb::IProgress* progress) {
+  for (const std::string& fault : {validateOptions(options), checkMesh(mesh), checkBones(bones)})
+    if (!fault.empty()) throw BindError(BindError::Kind::invalidInput, fault);
+
+  NullProgress silent;
+  PhaseClock clock(progress != nullptr ? *progress : silent);
+  auto phase = [&](const char* title, auto&& work) {
+    clock.begin(title, 0, 0);
+    work();
+    clock.end();
+  };
+  auto cancelled = [&] {
+    if (clock.isCanceled()) throw BindError(BindError::Kind::cancelled, "the binding was cancelled");
+  };
+
+  Result result;
+  Report& report = result.report;
+  WeldedMesh welded;
+  std::vector<std::uint32_t> pieceOf;
+  phase("Welding seams and orienting pieces", [&] {
+    welded = weldByPosition(mesh, defaultWeldTolerance(mesh));
+    report.turnedPieces = orientPiecesOutward(welded.mesh);
+    report.pieces = labelPieces(welded.mesh, pieceOf);
+  });
+  report.weldedVertices = welded.mesh.positions.size();
+  if (welded.mesh.triangles.empty())
+    throw BindError(BindError::Kind::invalidInput, "every triangle of the mesh is degenerate");
+  cancelled();
+
+  TipPlacement tips;
+  if (options.leafTips) phase("Placing leaf tips", [&] { tips = placeLeafTips(welded.mesh, bones); });
+  for (const LeafTip& tip : tips.tips) ++(tip.fromSkeleton ? report.tipsFromSkeleton : report.tipsCast);
+  report.leavesWithoutTip = tips.leavesWithoutTip;
+  std::vector<std::uint32_t> boneOfNode;
+  const std::vector<Node> nodes = bindingNodes(bones, tips.tips, boneOfNode);
+  // The method's own cut would count a leaf and its tip apart; with tips the cut comes after folding.
+  const unsigned methodLimit = tips.tips.empty() ? options.maxInfluences : 0u;
+
+  const Owned<gb::IContext> context(gb::IContext::create());
+  if (!context)
+    throw BindError(BindError::Kind::noOpenGL,
+                    "no OpenGL 2.1 context is current on this thread, and the binding context needs one for "
+                    "either method");
+  Weights nodeWeights = bindOnce(*context, welded.mesh, nodes, options, methodLimit, clock);
+  cancelled();
+  if (nodeWeights.numVertices() == 0 && report.pieces > 1) {
+    CancelOnly quiet(clock);
+    PieceBinding byPiece = bindInGroups(
+        welded.mesh, pieceOf, report.pieces,
+        [&](const Mesh& group) { return bindOnce(*context, group, nodes, options, methodLimit, quiet); },
+        clock);
+    cancelled();
+    nodeWeights = std::move(byPiece.weights);
+    report.boundByPiece = true;
+    report.unboundPieces = byPiece.unboundPieces;
+  }
+  if (nodeWeights.numVertices() == 0)
+    throw BindError(BindError::Kind::noWeights,
+                    std::string("the ") + (options.method == Method::geodesic ? "geodesic" : "heatmap") +
+                        " binding came back empty: no bone could be reached from the surface");
+
+  Weights finished;
+  phase("Finishing weights", [&] {
+    finished = foldAndLimit(nodeWeights, boneOfNode, options.maxInfluences);
+    report.orphanVertices = giveOrphansNearestJoint(welded.mesh, bones, finished);
+    for (std::size_t v = 0; v < finished.numVertices(); ++v)
+      report.maxInfluences = std::max<std::size_t>(report.maxInfluences, finished.end(v) - finished.begin(v));
+    report.meanInfluences =
+        static_cast<double>(finished.influences.size()) / static_cast<double>(finished.numVertices());
+    result.weights = unweldWeights(finished, welded.weldOf);
+  });
+  report.phases = std::move(clock.phases);
+  return result;
+}
+
+}  // namespace TessikSDK::Pipeline

@@ -1,0 +1,163 @@
+#include <iostream>
+#include <sstream>
+
+#include <gtest/gtest.h>
+
+#include "tessik/pipeline.h"
+
+#include "meshes/mesh_builders.h"
+#include "support/gl_context_fixture.h"
+
+namespace TessikSDK::Pipeline {
+namespace {
+
+Bone boneAt(const char* name, int parent, double x) {
+  Bone b;
+  b.name = name;
+  b.parent = parent;
+  b.bindPose = {1, 0, 0, x, 0, 1, 0, 0.02, 0, 0, 1, 0.01, 0, 0, 0, 1};
+  return b;
+}
+
+Mesh tube(float length) {
+  const tessik::meshes::TriMesh m = tessik::meshes::cylinderX(0.0f, length, 0.0f, 0.0f, 0.3f, 24, 16);
+  return {m.positions, m.triangles};
+}
+
+double weightOf(const Weights& w, std::size_t v, std::uint32_t bone) {
+  for (std::uint32_t i = w.begin(v); i < w.end(v); ++i)
+    if (w.influences[i].bone == bone) return w.influences[i].weight;
+  return 0.0;
+}
+
+class BindSkin : public tessik::test::GLContextTest, public ::testing::WithParamInterface<Method> {
+ protected:
+  void SetUp() override {
+    GLContextTest::SetUp();
+    if (IsSkipped() || HasFatalFailure()) return;
+    options.method = GetParam();
+    setConsoleReports(false);
+  }
+  void TearDown() override { setConsoleReports(true); }
+
+  static void setConsoleReports(bool on) { TessikSDK::GeomBind::setConsoleReports(on); }
+
+  Options options;
+};
+
+// A head with no child bone on a neck: without a tip of its own the head only ties with the neck past
+// its joint, and turning it would move the head half as far as it should.
+TEST_P(BindSkin, LeafTipsGiveTheHeadItsWholePart) {
+  const Mesh mesh = tube(3.0f);
+  const std::vector<Bone> bones = {boneAt("neck", -1, 0.2), boneAt("head", 0, 1.5)};
+  options.leafTips = false;
+  const Result without = bindSkin(mesh, bones, options);
+  options.leafTips = true;
+  const Result with = bindSkin(mesh, bones, options);
+  EXPECT_EQ(with.report.tipsCast, 1u);
+  EXPECT_EQ(without.report.tipsCast, 0u);
+
+  double sumWithout = 0.0, minWith = 1.0;
+  int headVertices = 0;
+  for (std::size_t v = 0; v < mesh.positions.size(); ++v) {
+    if (mesh.positions[v][0] < 2.0f) continue;
+    ++headVertices;
+    sumWithout += weightOf(without.weights, v, 1);
+    minWith = std::min(minWith, weightOf(with.weights, v, 1));
+  }
+  ASSERT_GT(headVertices, 0);
+  EXPECT_GE(minWith, 0.9);
+  EXPECT_NEAR(sumWithout / headVertices, 0.5, 0.2);
+  // The tip's own node never shows: every influence names one of the caller's two bones.
+  for (const Influence& in : with.weights.influences) EXPECT_LT(in.bone, 2u);
+}
+
+INSTANTIATE_TEST_SUITE_P(BothMethods,
+                         BindSkin,
+                         ::testing::Values(Method::geodesic, Method::heatmap),
+                         [](const auto& info) {
+                           return info.param == Method::geodesic ? "geodesic" : "heatmap";
+                         });
+
+class BindSkinGeodesic : public BindSkin {};
+
+// A surface wound inside out, or split along its seams, is the same surface to bind; the caller still
+// gets one row per vertex as given.
+TEST_P(BindSkinGeodesic, SeamsAndInsideOutPiecesBindAsTheCleanSurface) {
+  const Mesh clean = tube(3.0f);
+  const std::vector<Bone> bones = {boneAt("a", -1, 0.3), boneAt("b", 0, 1.5), boneAt("c", 1, 2.7)};
+  const Result reference = bindSkin(clean, bones, options);
+
+  Mesh messy = clean;
+  for (auto& t : messy.triangles) std::swap(t[1], t[2]);
+  // Vertex 5 split in two: the triangles after the first half use a copy of it.
+  const auto copy = static_cast<std::uint32_t>(messy.positions.size());
+  messy.positions.push_back(messy.positions[5]);
+  for (std::size_t t = messy.triangles.size() / 2; t < messy.triangles.size(); ++t)
+    for (auto& corner : messy.triangles[t])
+      if (corner == 5) corner = copy;
+  const Result messyResult = bindSkin(messy, bones, options);
+  EXPECT_EQ(messyResult.report.turnedPieces, 1u);
+  EXPECT_EQ(messyResult.report.weldedVertices, clean.positions.size());
+  ASSERT_EQ(messyResult.weights.numVertices(), messy.positions.size());
+  for (std::size_t v = 0; v < clean.positions.size(); ++v)
+    for (std::uint32_t b = 0; b < 3; ++b)
+      ASSERT_EQ(weightOf(messyResult.weights, v, b), weightOf(reference.weights, v, b)) << v;
+  for (std::uint32_t b = 0; b < 3; ++b)
+    EXPECT_EQ(weightOf(messyResult.weights, copy, b), weightOf(reference.weights, 5, b));
+  // The middle of the tube belongs to the middle bone.
+  for (std::size_t v = 0; v < clean.positions.size(); ++v)
+    if (std::abs(clean.positions[v][0] - 1.6f) < 0.1f) {
+      EXPECT_GT(weightOf(reference.weights, v, 1), 0.5) << v;
+    }
+}
+
+TEST_P(BindSkinGeodesic, RebindingGivesTheSameWeightsAndConsoleStaysQuiet) {
+  const Mesh mesh = tube(3.0f);
+  const std::vector<Bone> bones = {boneAt("a", -1, 0.3), boneAt("b", 0, 1.5)};
+  ::testing::internal::CaptureStdout();
+  const Result first = bindSkin(mesh, bones, options);
+  const Result second = bindSkin(mesh, bones, options);
+  EXPECT_EQ(::testing::internal::GetCapturedStdout(), "");
+  ASSERT_EQ(first.weights.offsets, second.weights.offsets);
+  for (std::size_t i = 0; i < first.weights.influences.size(); ++i) {
+    EXPECT_EQ(first.weights.influences[i].bone, second.weights.influences[i].bone);
+    EXPECT_EQ(first.weights.influences[i].weight, second.weights.influences[i].weight);
+  }
+  for (std::size_t v = 0; v < first.weights.numVertices(); ++v) {
+    ASSERT_LE(first.weights.end(v) - first.weights.begin(v), options.maxInfluences);
+    double total = 0.0;
+    for (std::uint32_t i = first.weights.begin(v); i < first.weights.end(v); ++i)
+      total += first.weights.influences[i].weight;
+    EXPECT_NEAR(total, 1.0, 1e-9);
+  }
+  setConsoleReports(true);
+  ::testing::internal::CaptureStdout();
+  bindSkin(mesh, bones, options);
+  EXPECT_NE(::testing::internal::GetCapturedStdout().find("Total (s)"), std::string::npos);
+}
+
+// Cancels as soon as the binding asks.
+class CancelAtOnce final : public TessikSDK::GeomBind::IProgress {
+ public:
+  void begin(const char*, int, int) override {}
+  void end() override {}
+  void setRange(int, int) override {}
+  bool update(int) override { return false; }
+  bool isCanceled() override { return true; }
+};
+
+TEST_P(BindSkinGeodesic, CancelledRunThrowsRatherThanReturningPartialWeights) {
+  CancelAtOnce cancel;
+  try {
+    bindSkin(tube(3.0f), {boneAt("a", -1, 0.3)}, options, &cancel);
+    FAIL() << "returned";
+  } catch (const BindError& e) {
+    EXPECT_EQ(e.kind(), BindError::Kind::cancelled);
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Geodesic, BindSkinGeodesic, ::testing::Values(Method::geodesic));
+
+}  // namespace
+}  // namespace TessikSDK::Pipeline

@@ -1,0 +1,133 @@
+#include <functional>
+#include <limits>
+
+#include <gtest/gtest.h>
+
+#include "tessik/pipeline.h"
+
+#include "pipeline/influences.h"
+
+namespace TessikSDK::Pipeline {
+namespace {
+
+Bone boneAt(const char* name, int parent, double x, double y = 0.0, double z = 0.0) {
+  Bone b;
+  b.name = name;
+  b.parent = parent;
+  b.bindPose = {1, 0, 0, x, 0, 1, 0, y, 0, 0, 1, z, 0, 0, 0, 1};
+  return b;
+}
+
+struct BadInput {
+  const char* name;
+  std::function<void(Mesh&, std::vector<Bone>&, Options&)> spoil;
+  const char* message;  // a part of the one line the caller gets
+};
+
+class RefusedInput : public ::testing::TestWithParam<BadInput> {};
+
+// Every fault is caught before anything is bound (no OpenGL context exists in this suite), and says what
+// is wrong in words a caller can act on.
+TEST_P(RefusedInput, IsNamedBeforeAnythingRuns) {
+  Mesh mesh{{{0, 0, 0}, {1, 0, 0}, {0, 1, 0}}, {{0, 1, 2}}};
+  std::vector<Bone> bones = {boneAt("root", -1, 0.2), boneAt("child", 0, 0.4)};
+  Options options;
+  GetParam().spoil(mesh, bones, options);
+  try {
+    bindSkin(mesh, bones, options);
+    FAIL() << "accepted";
+  } catch (const BindError& e) {
+    EXPECT_EQ(e.kind(), BindError::Kind::invalidInput);
+    EXPECT_NE(std::string(e.what()).find(GetParam().message), std::string::npos) << e.what();
+  }
+}
+
+const float kNaN = std::numeric_limits<float>::quiet_NaN();
+
+INSTANTIATE_TEST_SUITE_P(
+    Faults,
+    RefusedInput,
+    ::testing::Values(
+        BadInput{"NoVertices", [](Mesh& m, auto&, auto&) { m.positions.clear(); }, "no vertices"},
+        BadInput{"NoTriangles", [](Mesh& m, auto&, auto&) { m.triangles.clear(); }, "no triangles"},
+        BadInput{"IndexOutOfRange", [](Mesh& m, auto&, auto&) { m.triangles[0][2] = 3; },
+                 "triangle 0 names vertex 3, but the mesh has 3 vertices"},
+        BadInput{"NotFinite", [](Mesh& m, auto&, auto&) { m.positions[1][1] = kNaN; }, "vertex 1"},
+        BadInput{"OnePoint",
+                 [](Mesh& m, auto&, auto&) {
+                   m.positions.assign(3, {1, 1, 1});
+                 },
+                 "one point"},
+        BadInput{"OnlyDegenerate",
+                 [](Mesh& m, auto&, auto&) {
+                   m.triangles = {{0, 1, 1}};
+                 },
+                 "degenerate"},
+        BadInput{"NoBones", [](auto&, std::vector<Bone>& b, auto&) { b.clear(); }, "no bones"},
+        BadInput{"Unnamed", [](auto&, std::vector<Bone>& b, auto&) { b[1].name.clear(); },
+                 "bone 1 has no name"},
+        BadInput{"RepeatedName", [](auto&, std::vector<Bone>& b, auto&) { b[1].name = "root"; },
+                 "repeats the name of bone 0"},
+        BadInput{"ParentOutOfRange", [](auto&, std::vector<Bone>& b, auto&) { b[1].parent = 2; }, "parent 2"},
+        BadInput{"Cycle", [](auto&, std::vector<Bone>& b, auto&) { b[0].parent = 1; }, "form a cycle"},
+        BadInput{"PoseNotFinite", [](auto&, std::vector<Bone>& b, auto&) { b[0].bindPose[7] = kNaN; },
+                 "bind pose that is not finite"},
+        BadInput{"TipNotFinite",
+                 [](auto&, std::vector<Bone>& b, auto&) {
+                   b[1].hasTip = true;
+                   b[1].tip[0] = kNaN;
+                 },
+                 "tip that is not finite"},
+        BadInput{"ResolutionTooLow", [](auto&, auto&, Options& o) { o.resolution = 7; },
+                 "between 8 and 1024"},
+        BadInput{"FalloffNaN", [](auto&, auto&, Options& o) { o.falloff = kNaN; }, "falloff"},
+        BadInput{"TooManyInfluences", [](auto&, auto&, Options& o) { o.maxInfluences = 65; },
+                 "max influences"}),
+    [](const auto& info) { return std::string(info.param.name); });
+
+Weights rows(const std::vector<std::vector<Influence>>& perVertex) {
+  Weights w;
+  for (const auto& row : perVertex) {
+    w.influences.insert(w.influences.end(), row.begin(), row.end());
+    w.offsets.push_back(static_cast<std::uint32_t>(w.influences.size()));
+  }
+  return w;
+}
+
+std::vector<Influence> row(const Weights& w, std::size_t v) {
+  return {w.influences.begin() + w.begin(v), w.influences.begin() + w.end(v)};
+}
+
+TEST(FoldAndLimit, TipsJoinTheirLeafBeforeTheCut) {
+  // Nodes 0..2 are bones; node 3 is the tip of bone 2.
+  const Weights nodes = rows({{{1, 0.3}, {2, 0.25}, {3, 0.25}, {0, 0.2}},  // leaf 0.5 outranks bone 1
+                              {{0, 0.2}, {1, 0.2}, {2, 0.0}},              // a tie; zero weights go
+                              {}});
+  const Weights out = foldAndLimit(nodes, {0, 1, 2, 2}, 2);
+  ASSERT_EQ(out.numVertices(), 3u);
+  const auto first = row(out, 0);
+  ASSERT_EQ(first.size(), 2u);
+  EXPECT_EQ(first[0].bone, 2u);
+  EXPECT_EQ(first[1].bone, 1u);
+  EXPECT_NEAR(first[0].weight, 0.5 / 0.8, 1e-12);
+  EXPECT_NEAR(first[0].weight + first[1].weight, 1.0, 1e-12);
+  const auto second = row(out, 1);
+  ASSERT_EQ(second.size(), 2u);
+  EXPECT_EQ(second[0].bone, 0u) << "ties go to the lower bone, whatever order the method listed them in";
+  EXPECT_DOUBLE_EQ(second[0].weight, 0.5);
+  EXPECT_TRUE(row(out, 2).empty());
+}
+
+TEST(Orphans, TakeTheNearestJointWholly) {
+  const Mesh mesh{{{0, 0, 0}, {0.9f, 0, 0}, {2, 0, 0}}, {{0, 1, 2}}};
+  Weights w = rows({{{1, 1.0}}, {}, {}});
+  EXPECT_EQ(giveOrphansNearestJoint(mesh, {boneAt("a", -1, 0.0), boneAt("b", 0, 1.0)}, w), 2u);
+  EXPECT_EQ(row(w, 0)[0].bone, 1u) << "a weighted vertex keeps its weights";
+  ASSERT_EQ(row(w, 1).size(), 1u);
+  EXPECT_EQ(row(w, 1)[0].bone, 1u);
+  EXPECT_EQ(row(w, 2)[0].bone, 1u);
+  EXPECT_EQ(row(w, 2)[0].weight, 1.0);
+}
+
+}  // namespace
+}  // namespace TessikSDK::Pipeline
