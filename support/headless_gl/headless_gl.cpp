@@ -5,10 +5,13 @@
 #include <mutex>
 #include <utility>
 
+// GLEW must come before any other GL header, which the include sorting would not keep.
+// clang-format off
+#include <GL/glew.h>
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
 #include <GL/gl.h>
-#include <GL/glew.h>
+// clang-format on
 
 namespace tessik::support {
 namespace {
