@@ -28,18 +28,8 @@ inline const std::string& ensureGL() {
   GLState& gl = theGL();
   if (!gl.tried) {
     gl.tried = true;
-    gl.context = support::HeadlessGLContext::create(&gl.error);
-    if (!gl.context) {
-      if (gl.error.empty()) gl.error = "no headless OpenGL context";
-    } else {
-      // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only
-      // that it found no X display.
-      const GLenum glew = glewInit();
-      if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
-        gl.error = std::string("glewInit: ") + reinterpret_cast<const char*>(glewGetErrorString(glew));
-        gl.context.reset();
-      }
-    }
+    if (!support::ensureGLContext(gl.context, &gl.error) && gl.error.empty())
+      gl.error = "no headless OpenGL context";
   }
   return gl.error;
 }

@@ -21,6 +21,7 @@
 #include <pybind11/numpy.h>
 
 #include <tessik/geombind.h>
+#include <tessik/pipeline.h>
 
 #include "arrays.h"
 #include "headless_gl/headless_gl.h"
@@ -30,10 +31,7 @@ namespace tessik::python {
 
 namespace {
 
-using TessikSDK::GeomBind::IContext;
-using TessikSDK::GeomBind::IMesh;
-using TessikSDK::GeomBind::ISparseVertexWeights;
-using TessikSDK::GeomBind::ITransformHierarchy;
+namespace pl = TessikSDK::Pipeline;
 
 // Everything the library needs, read from numpy while the GIL is held, so the run itself never
 // touches a Python object.
@@ -42,12 +40,12 @@ struct BindInput {
   std::vector<std::uint32_t> triangles;
   std::vector<std::array<double, 16>> matrices;  // row-major, translation in elements 3, 7 and 11
   std::vector<std::string> names;
-  std::vector<std::string> parentNames;  // empty for a root
+  std::vector<std::int64_t> parents;  // -1 for a root
   std::size_t vertexCount() const { return vertices.size() / 3; }
 };
 
 struct BindOutput {
-  enum class Status { Done, Canceled, NoOpenGL, Empty } status = Status::Done;
+  enum class Status { Done, Canceled, NoOpenGL, Invalid, Empty } status = Status::Done;
   std::string message;
   std::size_t columns = 0;
   std::vector<std::int32_t> bones;  // vertexCount * columns, padded with -1
@@ -55,6 +53,32 @@ struct BindOutput {
 };
 
 std::string countText(std::size_t n, const char* what) { return std::to_string(n) + " " + what; }
+
+pl::Options pipelineOptions(const BindOptions& options) {
+  pl::Options o;
+  o.method = options.method == BindMethod::Heatmap ? pl::Method::heatmap : pl::Method::geodesic;
+  o.falloff = static_cast<float>(options.falloff);
+  o.maxInfluences = static_cast<unsigned>(options.maxInfluences);
+  o.resolution = static_cast<int>(options.resolution);
+  o.refineInterior = options.refineInterior;
+  o.leafTips = options.leafTips;
+  return o;
+}
+
+// The library's stage table and phase lines go to stdout, which in Python is the user's notebook or log:
+// shown only when asked for, and the process-wide switch is put back afterwards.
+class GeomBindConsole {
+ public:
+  explicit GeomBindConsole(bool verbose) : before_(TessikSDK::GeomBind::consoleReports()) {
+    TessikSDK::GeomBind::setConsoleReports(verbose);
+  }
+  ~GeomBindConsole() { TessikSDK::GeomBind::setConsoleReports(before_); }
+  GeomBindConsole(const GeomBindConsole&) = delete;
+  GeomBindConsole& operator=(const GeomBindConsole&) = delete;
+
+ private:
+  bool before_;
+};
 
 void readVertices(py::handle object, BindInput& in) {
   const py::array raw = asArray(object, "vertices");
@@ -200,85 +224,60 @@ void readNames(py::handle object, BindInput& in) {
   }
 }
 
-// Without the GIL. The library's only error channels are a null context and an empty result.
+// Without the GIL. Everything between the arrays and the weights is the library's binding pipeline, the
+// same one the command-line tool calls.
 BindOutput run(const BindInput& in, const BindOptions& options, ProgressBridge& progress) {
   BindOutput out;
-  // Declared before the binding context so that it is destroyed after it: the context's GL objects
-  // must go while their OpenGL context still exists.
+  // Declared before the binding so that it outlives the binding context the pipeline makes in it.
   std::optional<support::HeadlessGLContext> headless;
-  std::unique_ptr<IContext, decltype(&IContext::dispose)> context(IContext::create(), &IContext::dispose);
-  if (context == nullptr) {
-    std::string why;
-    headless = support::HeadlessGLContext::create(&why);
-    if (headless.has_value()) {
-      context.reset(IContext::create());
-      if (context == nullptr) {
-        why = "the headless context reports OpenGL '" + support::currentGLVersionString() +
-              "', but the binding context needs OpenGL 2.1 or later";
-      }
-    }
-    if (context == nullptr) {
-      out.status = BindOutput::Status::NoOpenGL;
-      out.message = why.empty() ? "no headless OpenGL context could be made" : why;
-      return out;
-    }
+  std::string why;
+  if (!support::ensureGLContext(headless, &why)) {
+    out.status = BindOutput::Status::NoOpenGL;
+    out.message = why.empty() ? "no headless OpenGL context could be made" : why;
+    return out;
+  }
+  pl::Mesh mesh;
+  mesh.positions.resize(in.vertexCount());
+  for (std::size_t v = 0; v < in.vertexCount(); ++v)
+    mesh.positions[v] = {in.vertices[3 * v], in.vertices[3 * v + 1], in.vertices[3 * v + 2]};
+  for (std::size_t t = 0; t + 2 < in.triangles.size(); t += 3)
+    mesh.triangles.push_back({in.triangles[t], in.triangles[t + 1], in.triangles[t + 2]});
+  std::vector<pl::Bone> bones(in.names.size());
+  for (std::size_t b = 0; b < bones.size(); ++b) {
+    bones[b].name = in.names[b];
+    bones[b].parent = static_cast<int>(in.parents[b]);
+    bones[b].bindPose = in.matrices[b];
   }
 
-  std::unique_ptr<IMesh, decltype(&IMesh::dispose)> mesh(IMesh::create(), &IMesh::dispose);
-  for (std::size_t v = 0; v < in.vertexCount(); ++v) {
-    mesh->addVertex(in.vertices[3 * v], in.vertices[3 * v + 1], in.vertices[3 * v + 2]);
+  const GeomBindConsole console(options.verbose);
+  pl::Result result;
+  try {
+    result = pl::bindSkin(mesh, bones, pipelineOptions(options), &progress);
+  } catch (const pl::BindError& e) {
+    using Kind = pl::BindError::Kind;
+    out.status = e.kind() == Kind::cancelled      ? BindOutput::Status::Canceled
+                 : e.kind() == Kind::noOpenGL     ? BindOutput::Status::NoOpenGL
+                 : e.kind() == Kind::invalidInput ? BindOutput::Status::Invalid
+                                                  : BindOutput::Status::Empty;
+    out.message = e.what();
+    return out;
   }
-  for (std::size_t t = 0; t + 2 < in.triangles.size(); t += 3) {
-    mesh->addTriangle(in.triangles[t], in.triangles[t + 1], in.triangles[t + 2]);
-  }
-  std::unique_ptr<ITransformHierarchy, decltype(&ITransformHierarchy::dispose)> hierarchy(
-      ITransformHierarchy::create(), &ITransformHierarchy::dispose);
-  for (std::size_t b = 0; b < in.names.size(); ++b) {
-    const std::string& parent = in.parentNames[b];
-    // Names were checked unique and non-empty, so the library refusing a node is a bug here.
-    if (!hierarchy->addNode(in.names[b].c_str(), in.matrices[b].data(),
-                            parent.empty() ? nullptr : parent.c_str())) {
-      throw std::logic_error("tessik: the library refused bone '" + in.names[b] + "'");
-    }
-  }
-
-  const auto limit = static_cast<unsigned int>(options.maxInfluences);
-  const auto falloff = static_cast<float>(options.falloff);
-  ISparseVertexWeights* result =
-      options.method == BindMethod::Heatmap
-          ? context->bindHeatmap(mesh.get(), hierarchy.get(), &progress, falloff, limit)
-          : context->bindGeodesicSparseVoxel(mesh.get(), hierarchy.get(), &progress, falloff, limit,
-                                             static_cast<int>(options.resolution), options.refineInterior);
-  // A cancelled run may still hand back lists; none of them is to reach the caller.
+  // A cancelled run may still hand back weights; none of them is to reach the caller.
   if (progress.canceled()) {
     out.status = BindOutput::Status::Canceled;
     return out;
   }
-  const std::size_t count = result->numVertices();
-  if (count != in.vertexCount()) {
-    out.status = BindOutput::Status::Empty;
-    out.message = count == 0 ? "the library returned no weights"
-                             : "the library returned weights for " + countText(count, "vertices") +
-                                   " instead of " + std::to_string(in.vertexCount());
-    return out;
-  }
-  for (unsigned int v = 0; v < count; ++v)
-    out.columns = std::max<std::size_t>(out.columns, result->numWeights(v));
-  if (out.columns == 0) {
-    out.status = BindOutput::Status::Empty;
-    out.message = "the library gave no vertex any influence";
-    return out;
-  }
+  const pl::Weights& w = result.weights;
+  for (std::size_t v = 0; v < w.numVertices(); ++v)
+    out.columns = std::max<std::size_t>(out.columns, w.end(v) - w.begin(v));
+  const std::size_t count = w.numVertices();
   out.bones.assign(count * out.columns, -1);
   out.weights.assign(count * out.columns, 0.0);
-  for (unsigned int v = 0; v < count; ++v) {
-    const unsigned int n = result->numWeights(v);
-    for (unsigned int k = 0; k < n; ++k) {
-      const TessikSDK::GeomBind::BoneWeight w = result->getWeight(v, k);
-      out.bones[v * out.columns + k] = static_cast<std::int32_t>(w.boneIndex);
-      out.weights[v * out.columns + k] = w.weight;
+  for (std::size_t v = 0; v < count; ++v)
+    for (std::uint32_t i = w.begin(v); i < w.end(v); ++i) {
+      out.bones[v * out.columns + (i - w.begin(v))] = static_cast<std::int32_t>(w.influences[i].bone);
+      out.weights[v * out.columns + (i - w.begin(v))] = w.influences[i].weight;
     }
-  }
   return out;
 }
 
@@ -319,19 +318,22 @@ py::tuple bind(py::handle vertices,
   readJoints(joints, in);
   const std::vector<std::int64_t> parentIndices = readParents(parents, in.matrices.size());
   readNames(names, in);
-  for (std::int64_t p : parentIndices) in.parentNames.push_back(p < 0 ? std::string() : in.names[p]);
+  in.parents = parentIndices;
 
-  if (!std::isfinite(options.falloff))
-    fail("falloff", "must be a finite number, got " + std::to_string(options.falloff));
-  if (options.maxInfluences < 0 || options.maxInfluences > std::numeric_limits<int>::max()) {
-    fail("max_influences", "must be 0 (keep every influence) or a positive count, got " +
+  // The ranges are the library's, shared with every other front end; only what a Python integer can hold
+  // beyond a C++ one is checked here first.
+  if (options.maxInfluences < 0 || options.maxInfluences > pl::Limits::maxInfluences) {
+    fail("max_influences", "must be between 0 (keep every influence) and " +
+                               std::to_string(pl::Limits::maxInfluences) + ", got " +
                                std::to_string(options.maxInfluences));
   }
-  if (options.method == BindMethod::Geodesic &&
-      (options.resolution < 2 || options.resolution > std::numeric_limits<int>::max())) {
-    fail("resolution",
-         "must be at least 2 voxels along the longest side, got " + std::to_string(options.resolution));
+  if (options.resolution < pl::Limits::minResolution || options.resolution > pl::Limits::maxResolution) {
+    fail("resolution", "must be between " + std::to_string(pl::Limits::minResolution) + " and " +
+                           std::to_string(pl::Limits::maxResolution) +
+                           " voxels along the longest side, got " + std::to_string(options.resolution));
   }
+  const std::string invalidOption = pl::validateOptions(pipelineOptions(options));
+  if (!invalidOption.empty()) throw py::value_error(invalidOption);
   if (!progress.is_none() && !PyCallable_Check(progress.ptr())) {
     throw py::type_error("progress must be None or callable(stage: str, fraction: float), got " +
                          py::str(py::type::of(progress)).cast<std::string>());
@@ -362,11 +364,12 @@ py::tuple bind(py::handle vertices,
                               " needs an OpenGL 2.1 context: none is current on this thread and no "
                               "headless one could be made.\n" +
                               out.message);
+    case BindOutput::Status::Invalid:
+      throw py::value_error(where + ": " + out.message);
     case BindOutput::Status::Empty:
-      throw BindingFailed(
-          where + ": " + out.message +
-          ". The library gives no reason; common ones are triangles of (nearly) zero area, joints "
-          "outside the mesh, or (geodesic) a resolution too coarse for thin parts.");
+      throw BindingFailed(where + ": " + out.message +
+                          ". Common causes are joints outside the mesh, or pieces of the surface that every "
+                          "bone is hidden from.");
   }
   const std::size_t rows = in.vertexCount();
   const std::size_t columns = out.columns;

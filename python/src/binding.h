@@ -24,8 +24,10 @@ struct BindOptions {
   BindMethod method = BindMethod::Heatmap;
   double falloff = 0.5;
   long long maxInfluences = 4;
-  long long resolution = 64;
+  long long resolution = 64;  // also checked for the heat method, whose callers keep the default
   bool refineInterior = false;
+  bool leafTips = true;
+  bool verbose = false;
 };
 
 // Validates the inputs, binds with the GIL released and returns (bone_indices, weights), both (V, k)

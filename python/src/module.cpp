@@ -46,10 +46,21 @@ names : sequence of str, optional
     Unique, non-empty bone names; "bone0", "bone1", ... when omitted. They only
     label the bones; indices in the result always follow the order of ``joints``.
 falloff : float, default 0.5
-    How sharply a bone's influence fades: 0 soft and wide, 1 sharp. The library
-    clamps it to [0, 1].
+    How sharply a bone's influence fades: 0 soft and wide, 1 sharp; in [0, 1].
 max_influences : int, default 4
-    Keep at most this many of the strongest bones per vertex; 0 keeps all.)doc";
+    Keep at most this many of the strongest bones per vertex (up to 64); 0 keeps all.
+leaf_tips : bool, default True
+    Give every leaf bone (a head, a hand without fingers, a tail tip) a tip of its
+    own, cast from its joint away from its parent to just inside the surface, so
+    that it carries its whole part instead of sharing it with its parent. Tips
+    never appear in the result.
+verbose : bool, default False
+    Let the library print its own phase lines and stage timings to stdout.
+
+The mesh is prepared as the command-line tool prepares it: vertices at the same
+position are welded (so seams do not cut the surface), pieces wound inside out are
+turned for binding, pieces that cannot be bound with the rest are bound on their
+own, and a vertex no bone reaches takes its nearest joint.)doc";
 
 constexpr const char* kSharedProgress = R"doc(
 progress : callable(stage: str, fraction: float), optional
@@ -73,7 +84,7 @@ ValueError
     coordinate is not finite, or ``parents`` is not a forest; the message names
     the argument.
 BindingError
-    The library returned no weights (it gives no reason; see the message).
+    No piece of the surface could reach any bone (see the message).
 OpenGLUnavailableError
     No OpenGL context is current and no headless one could be made; the message
     says which packages provide one.
@@ -115,7 +126,7 @@ Parameters
 ----------)doc") +
          kSharedParameters + R"doc(
 resolution : int, default 64
-    Voxels along the longest side of the mesh box, at least 2. Time and memory
+    Voxels along the longest side of the mesh box, 8 to 1024. Time and memory
     grow with its cube; thin parts need enough voxels across them.
 refine_interior : bool, default False
     Classify the interior voxels more carefully, at some extra cost.)doc" +
@@ -194,25 +205,29 @@ PYBIND11_MODULE(tessik, m) {
   m.def(
       "bind_heatmap",
       [](py::handle vertices, py::handle triangles, py::handle joints, py::handle parents, py::handle names,
-         double falloff, long long maxInfluences, py::object progress) {
+         double falloff, long long maxInfluences, bool leafTips, bool verbose, py::object progress) {
         BindOptions options;
         options.method = BindMethod::Heatmap;
         options.falloff = falloff;
         options.maxInfluences = maxInfluences;
+        options.leafTips = leafTips;
+        options.verbose = verbose;
         return tessik::python::bind(vertices, triangles, joints, parents, names, options,
                                     std::move(progress));
       },
       heatmapDoc().c_str(), py::arg("vertices"), py::arg("triangles"), py::arg("joints"), py::arg("parents"),
       py::arg("names") = py::none(), py::kw_only(), py::arg("falloff") = 0.5, py::arg("max_influences") = 4,
-      py::arg("progress") = py::none());
+      py::arg("leaf_tips") = true, py::arg("verbose") = false, py::arg("progress") = py::none());
 
   m.def(
       "bind_geodesic",
       [](py::handle vertices, py::handle triangles, py::handle joints, py::handle parents, py::handle names,
-         double falloff, long long maxInfluences, long long resolution, bool refineInterior,
-         py::object progress) {
+         double falloff, long long maxInfluences, long long resolution, bool refineInterior, bool leafTips,
+         bool verbose, py::object progress) {
         BindOptions options;
         options.method = BindMethod::Geodesic;
+        options.leafTips = leafTips;
+        options.verbose = verbose;
         options.falloff = falloff;
         options.maxInfluences = maxInfluences;
         options.resolution = resolution;
@@ -222,7 +237,8 @@ PYBIND11_MODULE(tessik, m) {
       },
       geodesicDoc().c_str(), py::arg("vertices"), py::arg("triangles"), py::arg("joints"), py::arg("parents"),
       py::arg("names") = py::none(), py::kw_only(), py::arg("falloff") = 0.5, py::arg("max_influences") = 4,
-      py::arg("resolution") = 64, py::arg("refine_interior") = false, py::arg("progress") = py::none());
+      py::arg("resolution") = 64, py::arg("refine_interior") = false, py::arg("leaf_tips") = true,
+      py::arg("verbose") = false, py::arg("progress") = py::none());
 
   m.def("to_dense", &tessik::python::denseWeights, kDenseDoc, py::arg("bone_indices"), py::arg("weights"),
         py::arg("num_bones") = py::none());

@@ -20,7 +20,7 @@ def gl():
         tetra = np.array([[0, 0, 0], [1, 0, 0], [0, 1, 0], [0, 0, 1]], float)
         faces = np.array([[0, 2, 1], [0, 1, 3], [0, 3, 2], [1, 2, 3]])
         try:
-            tessik.bind_geodesic(tetra, faces, [[0.2, 0.2, 0.2]], [-1], resolution=4)
+            tessik.bind_geodesic(tetra, faces, [[0.2, 0.2, 0.2]], [-1], resolution=8)
         except tessik.OpenGLUnavailableError as error:
             _gl_error = str(error)
         except tessik.BindingError:

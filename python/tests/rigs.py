@@ -1,6 +1,8 @@
 """Meshes, rigs and references shared by the tests, built with numpy only."""
 
+import json
 import os
+import struct
 import subprocess
 from typing import NamedTuple
 
@@ -110,32 +112,43 @@ def skinning_reference(points, bind, poses, bone_indices, weights, object_matrix
     return blended
 
 
-def reference_bind(tmp_path, rig, method, falloff=0.5, max_influences=4, resolution=32,
-                   refine_interior=False):
-    """The raw per-vertex lists from binding `rig` through the C++ interface (tessik_bind_reference),
-    or None when the program is not available."""
-    program = os.environ.get("TESSIK_BIND_REFERENCE")
+def _glb_accessor(document, binary, index):
+    accessor = document["accessors"][index]
+    view = document["bufferViews"][accessor["bufferView"]]
+    dtype = {5126: np.float32, 5125: np.uint32, 5123: np.uint16, 5121: np.uint8}[accessor["componentType"]]
+    width = {"SCALAR": 1, "VEC3": 3, "VEC4": 4}[accessor["type"]]
+    start = view.get("byteOffset", 0) + accessor.get("byteOffset", 0)
+    return np.frombuffer(binary, dtype, accessor["count"] * width, start).reshape(accessor["count"], width)
+
+
+def tool_bind(tmp_path, rig, method, resolution=32):
+    """Binds `rig` through tessik-bind, which reads it as OBJ and JSON, and answers (mesh, rows): the mesh
+    as the tool read it (vertices, triangles, from the GLB it wrote) and, per vertex of that mesh, its
+    (bone, weight) pairs from the CSV. None when the program is not available."""
+    program = os.environ.get("TESSIK_BIND_EXE")
     if not program:
         return None
-    path = tmp_path / f"{method}.txt"
-    with open(path, "w") as f:
-        f.write(f"{method} {falloff!r} {max_influences} {resolution} {int(refine_interior)}\n")
-        # repr of a Python float round-trips; float32 values are exact in it.
-        f.write(f"{len(rig.vertices)}\n")
-        f.writelines(" ".join(repr(float(c)) for c in v) + "\n" for v in rig.vertices)
-        f.write(f"{len(rig.triangles)}\n")
-        f.writelines(" ".join(map(str, t)) + "\n" for t in rig.triangles)
-        f.write(f"{len(rig.joints)}\n")
-        for name, parent, matrix in zip(rig.names, rig.parents, rig.joints):
-            parent_name = "-" if parent < 0 else rig.names[parent]
-            f.write(f"{name} {parent_name} " + " ".join(repr(float(e)) for e in matrix.ravel()) + "\n")
-    run = subprocess.run([program, str(path)], capture_output=True, text=True, check=True)
-    lines = run.stdout.splitlines()
-    start = max(i for i, line in enumerate(lines) if line.startswith("weights "))
-    count = int(lines[start].split()[1])
-    lists = []
-    for line in lines[start + 1:start + 1 + count]:
-        fields = line.split()
-        n = int(fields[0])
-        lists.append([(int(fields[1 + 2 * j]), float(fields[2 + 2 * j])) for j in range(n)])
-    return lists
+    obj, skeleton = tmp_path / "rig.obj", tmp_path / "rig.json"
+    glb, csv = tmp_path / "rig.glb", tmp_path / "weights.csv"
+    with open(obj, "w") as f:
+        f.writelines("v " + " ".join(f"{c:.9g}" for c in v) + "\n" for v in rig.vertices.astype(float))
+        f.writelines("f " + " ".join(str(i + 1) for i in t) + "\n" for t in rig.triangles)
+    bones = [{"name": name, "parent": None if parent < 0 else rig.names[parent],
+              "matrix": [float(e) for e in matrix.ravel()]}
+             for name, parent, matrix in zip(rig.names, rig.parents, rig.joints)]
+    skeleton.write_text(json.dumps(bones))
+    subprocess.run([program, str(obj), "--skeleton", str(skeleton), "--method", method, "--resolution",
+                    str(resolution), "-o", str(glb), "--csv", str(csv)], capture_output=True, check=True)
+    data = glb.read_bytes()
+    json_length = struct.unpack_from("<I", data, 12)[0]
+    document = json.loads(data[20:20 + json_length])
+    binary = data[20 + json_length + 8:]
+    primitive = document["meshes"][0]["primitives"][0]
+    vertices = _glb_accessor(document, binary, primitive["attributes"]["POSITION"])
+    triangles = _glb_accessor(document, binary, primitive["indices"]).reshape(-1, 3).astype(np.int64)
+    index = {name: b for b, name in enumerate(rig.names)}
+    rows = [[] for _ in vertices]
+    for line in csv.read_text().splitlines()[1:]:
+        vertex, bone, weight = line.split(",")
+        rows[int(vertex)].append((index[bone], np.float32(weight)))
+    return rig._replace(vertices=vertices.copy(), triangles=triangles), rows

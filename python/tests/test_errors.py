@@ -57,8 +57,10 @@ BIND_ERRORS = {
     "names one str": (dict(names="abc"), "names must be a sequence of 3 strings, not a single string"),
     "names not iterable": (dict(names=3), "names must be a sequence of 3 strings"),
     "names nul": (dict(names=["a", "b\0", "c"]), r"names\[1\] contains a NUL character"),
-    "falloff nan": (dict(falloff=float("nan")), "falloff must be a finite number"),
-    "max_influences negative": (dict(max_influences=-1), "max_influences must be 0 .* got -1"),
+    "falloff nan": (dict(falloff=float("nan")), "falloff must be between 0 .* got nan"),
+    "falloff above one": (dict(falloff=1.5), "falloff must be between 0 .* got 1.5"),
+    "max_influences negative": (dict(max_influences=-1), "max_influences must be between 0 .* got -1"),
+    "max_influences too many": (dict(max_influences=65), "max_influences must be between 0 .* and 64, got 65"),
 }
 
 
@@ -72,9 +74,9 @@ def test_bad_binding_input_raises_value_error_naming_it(function, overrides, mes
         function(*args.values(), **options)
 
 
-@pytest.mark.parametrize("resolution", [1, 0, -5])
-def test_geodesic_resolution_below_two_is_refused(resolution):
-    with pytest.raises(ValueError, match=f"resolution must be at least 2 .* got {resolution}"):
+@pytest.mark.parametrize("resolution", [7, 0, -5, 1025])
+def test_geodesic_resolution_outside_the_tools_range_is_refused(resolution):
+    with pytest.raises(ValueError, match=f"resolution must be between 8 and 1024 .* got {resolution}"):
         tessik.bind_geodesic(*ARM, resolution=resolution)
 
 

@@ -82,7 +82,7 @@ ISparseVertexWeights* ContextImpl::bindGeodesicSparseVoxel(IMesh* mesh,
   result.perVertex = VertexWeights();
   const BindInputs inputs = bindInputs(mesh, hierarchy);
   if (inputs.mesh == nullptr) return &result;
-  prepareForBinding(*inputs.mesh, *inputs.hierarchy, true);
+  prepareForBinding(*inputs.mesh, *inputs.hierarchy, PreparationMode::geodesic);
 
   Algorithm::GeodesicSparseVoxelOptions options;
   options.resolution = resolution;
@@ -107,7 +107,7 @@ ISparseVertexWeights* ContextImpl::bindHeatmap(IMesh* mesh,
   result.perVertex = VertexWeights();
   const BindInputs inputs = bindInputs(mesh, hierarchy);
   if (inputs.mesh == nullptr) return &result;
-  prepareForBinding(*inputs.mesh, *inputs.hierarchy, false);
+  prepareForBinding(*inputs.mesh, *inputs.hierarchy, PreparationMode::heatmap);
   Algorithm::computeVertexNormals(*inputs.mesh);
 
   Algorithm::HeatmapOptions options;

@@ -74,10 +74,10 @@ void buildTopology(MeshData& mesh) {
   mesh.edges.assign(edges.begin(), edges.end());
 }
 
-void prepareForBinding(MeshData& mesh, HierarchyData& hierarchy, bool geodesicMode) {
+void prepareForBinding(MeshData& mesh, HierarchyData& hierarchy, PreparationMode mode) {
   normalizeMesh(mesh);
   buildTopology(mesh);
-  if (geodesicMode) {
+  if (mode == PreparationMode::geodesic) {
     // A margin around the unit cube keeps surface voxels off the grid's outer faces.
     mesh.boundingBox = Collision::AABB(glm::dvec3(-0.00001), glm::dvec3(1.00001));
   }

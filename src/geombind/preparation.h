@@ -21,9 +21,12 @@ void normalizeMesh(MeshData& mesh);
 /// Rebuilds edges, edgeOpposite, vertexNeighbours and vertexTriangles from the triangles.
 void buildTopology(MeshData& mesh);
 
+/// Which method a preparation is for: the geodesic method voxelises a fixed cube around the unit frame.
+enum class PreparationMode { heatmap, geodesic };
+
 /// The preparation both methods share: unit frame, adjacency tables, and every node reduced to its
 /// joint position in the unit frame. In geodesic mode the box becomes a cube just larger than the unit
 /// cube. Changes mesh and hierarchy in place; call isBindable first.
-void prepareForBinding(MeshData& mesh, HierarchyData& hierarchy, bool geodesicMode);
+void prepareForBinding(MeshData& mesh, HierarchyData& hierarchy, PreparationMode mode);
 
 }  // namespace TessikSDK::GeomBind

@@ -21,7 +21,7 @@ std::array<double, 16> rowMajor(double x, double y, double z) {
 }
 
 // Vertices (2, 2, 2) and (4, 3, 2.5): offset (2, 2, 2), scale 1 / 2, one joint at (3, 2, 2).
-class Preparation : public ::testing::TestWithParam<bool> {
+class Preparation : public ::testing::TestWithParam<PreparationMode> {
  protected:
   void SetUp() override {
     mesh.addVertex(2, 2, 2);
@@ -39,7 +39,7 @@ TEST_P(Preparation, MovesMeshAndJointsIntoTheUnitFrame) {
   EXPECT_EQ(m.normalizeScale, 0.5f);
   EXPECT_EQ(m.vertices[0].position, (Float3{0, 0, 0}));
   EXPECT_EQ(m.vertices[1].position, (Float3{1, 0.5f, 0.25f}));
-  if (GetParam()) {
+  if (GetParam() == PreparationMode::geodesic) {
     EXPECT_EQ(m.boundingBox.lower, glm::dvec3(-0.00001));
     EXPECT_EQ(m.boundingBox.upper, glm::dvec3(1.00001));
   } else {
@@ -50,9 +50,12 @@ TEST_P(Preparation, MovesMeshAndJointsIntoTheUnitFrame) {
   EXPECT_EQ(bones.data.transforms[0], expected);
 }
 
-INSTANTIATE_TEST_SUITE_P(BothModes, Preparation, ::testing::Values(false, true), [](const auto& info) {
-  return info.param ? "geodesic" : "heatmap";
-});
+INSTANTIATE_TEST_SUITE_P(BothModes,
+                         Preparation,
+                         ::testing::Values(PreparationMode::heatmap, PreparationMode::geodesic),
+                         [](const auto& info) {
+                           return info.param == PreparationMode::geodesic ? "geodesic" : "heatmap";
+                         });
 
 TEST(PreparationRepeat, SecondGeodesicRunDriftsByThePadding) {
   MeshImpl mesh;
@@ -60,9 +63,9 @@ TEST(PreparationRepeat, SecondGeodesicRunDriftsByThePadding) {
   mesh.addVertex(0, 0, 0);
   mesh.addVertex(1, 1, 1);
   ASSERT_TRUE(bones.addNode("j", rowMajor(1, 0, 0).data(), nullptr));
-  prepareForBinding(mesh.data, bones.data, true);
+  prepareForBinding(mesh.data, bones.data, PreparationMode::geodesic);
   ASSERT_EQ(mesh.data.vertices[1].position, (Float3{1, 1, 1}));
-  prepareForBinding(mesh.data, bones.data, true);
+  prepareForBinding(mesh.data, bones.data, PreparationMode::geodesic);
   // The padded cube became the box, so the second run shifts by 0.00001 and scales by 1 / 1.00002.
   const float offset = static_cast<float>(-0.00001);
   const float scale = static_cast<float>(1.0 / (1.00001 - -0.00001));
@@ -76,7 +79,7 @@ TEST(PreparationRepeat, JointsWithoutVerticesKeepTheirPositions) {
   MeshImpl mesh;
   TransformHierarchyImpl bones;
   ASSERT_TRUE(bones.addNode("j", rowMajor(0.1, 2, 3).data(), nullptr));
-  prepareForBinding(mesh.data, bones.data, false);
+  prepareForBinding(mesh.data, bones.data, PreparationMode::heatmap);
   EXPECT_EQ(bones.data.transforms[0][12], static_cast<double>(0.1f));
   EXPECT_EQ(bones.data.transforms[0][0], 1.0);
   EXPECT_EQ(bones.data.transforms[0][1], 0.0);

@@ -32,7 +32,7 @@ struct Joint {
   int parent = -1;  // index into Skeleton::joints, always smaller than this joint's own; -1 for a root
   Mat4 bindPose{};  // the joint's frame in mesh space at bind time
   // Where the bone ends, when the file says so (an end node under a leaf bone, a "tip" in the JSON).
-  std::optional<Vec3f> tip;
+  std::optional<Vec3f> tip{};
 };
 
 struct Skeleton {

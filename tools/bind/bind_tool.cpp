@@ -118,10 +118,11 @@ ImportedAsset loadAsset(const ToolOptions& o) {
   return asset;
 }
 
+// `made` holds the headless context when the tool had to make one; the preview draws in it afterwards.
 BoundAsset bindWithContext(const ImportedAsset& asset,
                            const BindSettings& settings,
-                           gb::IProgress& progress) {
-  std::optional<support::HeadlessGLContext> made;
+                           gb::IProgress& progress,
+                           std::optional<support::HeadlessGLContext>& made) {
   std::string error;
   if (!support::ensureGLContext(made, &error))
     throw Failure(kExitFailed,
@@ -269,7 +270,8 @@ int runBindTool(const ToolOptions& options,
     ImportedAsset asset = timed("import", [&] { return loadAsset(o); });
     // A misspelt bone in --pose should fail now, not after a long binding.
     std::vector<Mat4> posed = posedJointTransforms(asset.skeleton, o.pose);
-    BoundAsset bound = timed("bind", [&] { return bindWithContext(asset, o.settings, progress); });
+    std::optional<support::HeadlessGLContext> context;
+    BoundAsset bound = timed("bind", [&] { return bindWithContext(asset, o.settings, progress, context); });
     if (progress.isCanceled() || (cancel != nullptr && cancel->load()))
       throw Failure(kExitCancelled, "cancelled; nothing was written");
     BoundRun run{o, std::move(asset), std::move(posed), std::move(bound), {}};

@@ -138,7 +138,7 @@ struct VoxelCounts {
 VoxelCounts CountSparseVoxels(const Character& character, std::int32_t resolution) {
   MeshData mesh = character.mesh;
   HierarchyData hierarchy = character.hierarchy;
-  TessikSDK::GeomBind::prepareForBinding(mesh, hierarchy, true);
+  TessikSDK::GeomBind::prepareForBinding(mesh, hierarchy, TessikSDK::GeomBind::PreparationMode::geodesic);
   NoProgress progress;
   TessikSDK::GeomBind::Collision::Octree octree;
   Algorithm::computeOctree(progress, mesh, hierarchy, resolution, octree);
@@ -178,7 +178,7 @@ void BM_GeodesicBind(benchmark::State& state) {
     state.PauseTiming();
     MeshData mesh = character.mesh;
     HierarchyData hierarchy = character.hierarchy;
-    TessikSDK::GeomBind::prepareForBinding(mesh, hierarchy, true);
+    TessikSDK::GeomBind::prepareForBinding(mesh, hierarchy, TessikSDK::GeomBind::PreparationMode::geodesic);
     state.ResumeTiming();
 
     VertexWeights weights;

@@ -94,7 +94,8 @@ Character MakeCharacter(double detail) {
 // What ContextImpl::bindHeatmap does before it hands over to the strategy.
 Character Prepared(const Character& character) {
   Character copy = character;
-  TessikSDK::GeomBind::prepareForBinding(copy.mesh, copy.hierarchy, false);
+  TessikSDK::GeomBind::prepareForBinding(copy.mesh, copy.hierarchy,
+                                         TessikSDK::GeomBind::PreparationMode::heatmap);
   Algorithm::computeVertexNormals(copy.mesh);
   return copy;
 }
