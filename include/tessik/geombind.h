@@ -42,6 +42,17 @@ class TESSIK_API IProgress {
   virtual bool isCanceled() = 0;
 };
 
+/// A progress object that reports nothing and never cancels, for hosts that want a binding quiet.
+class TESSIK_API NullProgress final : public IProgress {
+ public:
+  ~NullProgress() override;
+  void begin(const char* title, int total, int start) override;
+  void end() override;
+  void setRange(int total, int start) override;
+  bool update(int value) override;
+  bool isCanceled() override;
+};
+
 /// The weights of the last binding run on a context. Owned by the context: never dispose it; it is
 /// replaced by the context's next binding.
 class TESSIK_API ISparseVertexWeights {

@@ -128,15 +128,6 @@ TESSIK_API Result bindSkin(const Mesh& mesh,
                            const Options& options,
                            GeomBind::IProgress* progress = nullptr);
 
-/// A progress object that reports nothing and never cancels, for hosts that want the library quiet.
-class TESSIK_API NullProgress final : public GeomBind::IProgress {
- public:
-  ~NullProgress() override;
-  void begin(const char* title, int total, int start) override;
-  void end() override;
-  void setRange(int total, int start) override;
-  bool update(int value) override;
-  bool isCanceled() override;
-};
+using GeomBind::NullProgress;
 
 }  // namespace TessikSDK::Pipeline

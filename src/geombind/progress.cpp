@@ -15,6 +15,13 @@ bool consoleReports() { return g_consoleReports; }
 
 IProgress::~IProgress() = default;
 
+NullProgress::~NullProgress() = default;
+void NullProgress::begin(const char*, int, int) {}
+void NullProgress::end() {}
+void NullProgress::setRange(int, int) {}
+bool NullProgress::update(int) { return false; }
+bool NullProgress::isCanceled() { return false; }
+
 ProgressImpl::ProgressImpl(std::string name) : taskName(std::move(name)) {}
 
 ProgressImpl::~ProgressImpl() = default;

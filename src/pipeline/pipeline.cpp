@@ -134,13 +134,6 @@ Weights bindOnce(gb::IContext& context,
 BindError::BindError(Kind kind, const std::string& message) : std::runtime_error(message), kind_(kind) {}
 BindError::~BindError() = default;
 
-NullProgress::~NullProgress() = default;
-void NullProgress::begin(const char*, int, int) {}
-void NullProgress::end() {}
-void NullProgress::setRange(int, int) {}
-bool NullProgress::update(int) { return false; }
-bool NullProgress::isCanceled() { return false; }
-
 std::string validateOptions(const Options& o) {
   if (o.method != Method::geodesic && o.method != Method::heatmap)
     return "method must be geodesic or heatmap";

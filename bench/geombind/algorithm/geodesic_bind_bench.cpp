@@ -56,15 +56,6 @@ using TessikSDK::GeomBind::VertexWeights;
 namespace Algorithm = TessikSDK::GeomBind::Algorithm;
 namespace meshes = tessik::meshes;
 
-class NoProgress : public IProgress {
- public:
-  void begin(const char*, int, int) override {}
-  void end() override {}
-  void setRange(int, int) override {}
-  bool update(int) override { return false; }
-  bool isCanceled() override { return false; }
-};
-
 // Swallows what the bind prints (its timing table) so the benchmark's own table stays readable.
 class NullBuffer : public std::streambuf {
  protected:
@@ -139,7 +130,7 @@ VoxelCounts CountSparseVoxels(const Character& character, std::int32_t resolutio
   MeshData mesh = character.mesh;
   HierarchyData hierarchy = character.hierarchy;
   TessikSDK::GeomBind::prepareForBinding(mesh, hierarchy, TessikSDK::GeomBind::PreparationMode::geodesic);
-  NoProgress progress;
+  TessikSDK::GeomBind::NullProgress progress;
   TessikSDK::GeomBind::Collision::Octree octree;
   Algorithm::computeOctree(progress, mesh, hierarchy, resolution, octree);
   const std::vector<Algorithm::VoxelGrid> levels =
@@ -169,7 +160,7 @@ void BM_GeodesicBind(benchmark::State& state) {
   options.smoothingIterations = Algorithm::smoothingIterationsFor(resolution);
 
   Algorithm::GeodesicSparseVoxelBind strategy;
-  NoProgress progress;
+  TessikSDK::GeomBind::NullProgress progress;
   // Keyed by counter name, in the order the stages first ran.
   std::vector<std::pair<std::string, double>> stageSeconds;
   double totalSeconds = 0.0;

@@ -63,15 +63,6 @@ using Clock = std::chrono::steady_clock;
 constexpr float kFalloff = 0.5f;
 constexpr std::int32_t kInfluenceLimit = 4;
 
-class NoProgress : public IProgress {
- public:
-  void begin(const char*, int, int) override {}
-  void end() override {}
-  void setRange(int, int) override {}
-  bool update(int) override { return false; }
-  bool isCanceled() override { return false; }
-};
-
 struct Character {
   MeshData mesh;  // as the host hands it over: not yet prepared
   HierarchyData hierarchy;
@@ -226,7 +217,7 @@ void BM_HeatmapBind(benchmark::State& state) {
   options.influenceLimit = kInfluenceLimit;
   options.falloff = kFalloff;
   Algorithm::HeatmapBind strategy;
-  NoProgress progress;
+  TessikSDK::GeomBind::NullProgress progress;
   double bindSeconds = 0.0;
   std::size_t emptyLists = 0, unnormalised = 0, overLimit = 0;
   for (auto _ : state) {

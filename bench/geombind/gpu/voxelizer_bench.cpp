@@ -48,15 +48,6 @@ namespace Gpu = TessikSDK::GeomBind::Gpu;
 constexpr int kRingSteps = 250;
 constexpr int kTubeSteps = 100;
 
-class NoProgress : public IProgress {
- public:
-  void begin(const char*, int, int) override {}
-  void end() override {}
-  void setRange(int, int) override {}
-  bool update(int) override { return false; }
-  bool isCanceled() override { return false; }
-};
-
 // The frame the binding prepares: positions in the unit cube, the grid over a slightly padded cube.
 MeshData MakeMesh() {
   const tessik::meshes::TriMesh torus =
@@ -106,7 +97,7 @@ void BM_VoxelizeInterior(benchmark::State& state) {
   const MeshData& mesh = TheMesh();
   const auto n = static_cast<std::uint32_t>(state.range(0));
   const std::array<std::uint32_t, 3> dims = {n, n, n};
-  NoProgress progress;
+  TessikSDK::GeomBind::NullProgress progress;
   VoxelBitGrid grid;
   Gpu::SweepTimings sweeps;
   double classifySeconds = 0.0;
@@ -257,7 +248,7 @@ void BM_CpuRayParity(benchmark::State& state) {
   auto found = GpuGrids().find(n);
   if (found == GpuGrids().end() && tessik::bench::ensureGL().empty()) {
     VoxelBitGrid gpu(n, n, n);
-    NoProgress progress;
+    TessikSDK::GeomBind::NullProgress progress;
     Gpu::voxelizeInterior(progress, mesh, gpu, false, 0.0f);
     found = GpuGrids().emplace(n, std::move(gpu)).first;
   }
