@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <limits>
 #include <utility>
 
 namespace TessikSDK::Pipeline {
@@ -65,6 +66,23 @@ double exitDistance(const Mesh& mesh, const Vec3& origin, const Vec3& direction,
   return 0.0;
 }
 
+// How far the tip may run from its leaf's joint before it is nearer another joint than its own: past
+// the plane halfway to that joint it would take the part that joint's bone carries (a second chain's
+// root, a bone the file forgot to parent).
+double reachBeforeOtherJoints(const std::vector<Bone>& bones,
+                              std::uint32_t leaf,
+                              const Vec3& joint,
+                              const Vec3& direction) {
+  double reach = std::numeric_limits<double>::infinity();
+  for (std::uint32_t other = 0; other < bones.size(); ++other) {
+    if (other == leaf) continue;
+    const Vec3 toOther = sub(jointOf(bones[other]), joint);
+    const double ahead = dot(direction, toOther);
+    if (ahead > 0.0) reach = std::min(reach, dot(toOther, toOther) / (2.0 * ahead));
+  }
+  return reach;
+}
+
 }  // namespace
 
 double windingNumber(const Mesh& mesh, const Vec3& point) {
@@ -90,27 +108,38 @@ TipPlacement placeLeafTips(const Mesh& mesh, const std::vector<Bone>& bones) {
     if (hasChild[b]) continue;
     const Bone& leaf = bones[b];
     const Vec3 joint = jointOf(leaf);
-    if (leaf.hasTip && sub(leaf.tip, joint) != Vec3{0.0, 0.0, 0.0}) {
-      placement.tips.push_back({b, leaf.tip, true});
+    Vec3 direction{};
+    double length = 0.0;
+    const bool fromSkeleton = leaf.hasTip && norm(sub(leaf.tip, joint)) > 0.0;
+    if (fromSkeleton) {
+      length = norm(sub(leaf.tip, joint));
+      for (int k = 0; k < 3; ++k) direction[k] = (leaf.tip[k] - joint[k]) / length;
+    } else if (leaf.parent >= 0) {
+      const Vec3 along = sub(joint, jointOf(bones[static_cast<std::size_t>(leaf.parent)]));
+      const double parentLength = norm(along);
+      if (parentLength > 0.0) {
+        for (int k = 0; k < 3; ++k) direction[k] = along[k] / parentLength;
+        length = kTipLengthCap * parentLength;
+      }
+    }
+    // A joint inside a body wrapped in clothing is inside both: the ray has to come out of each.
+    const double winding = length > 0.0 ? windingNumber(mesh, joint) : 0.0;
+    if (winding >= 0.5) {
+      const double exit = exitDistance(mesh, joint, direction, static_cast<int>(std::lround(winding)));
+      // The skeleton's own end is trusted while it stays inside; one past the surface would claim the air.
+      if (!fromSkeleton || (exit > 0.0 && length > exit)) length = std::min(length, kTipReach * exit);
+    } else if (!fromSkeleton) {
+      length = 0.0;  // cast from a joint in the air, the ray would say nothing about the part
+    }
+    length = std::min(length, reachBeforeOtherJoints(bones, b, joint, direction));
+    if (!(length > 0.0)) {
+      ++placement.leavesWithoutTip;
       continue;
     }
-    ++placement.leavesWithoutTip;
-    if (leaf.parent < 0) continue;
-    const Vec3 along = sub(joint, jointOf(bones[static_cast<std::size_t>(leaf.parent)]));
-    const double parentLength = norm(along);
-    if (parentLength == 0.0) continue;
-    const Vec3 direction = {along[0] / parentLength, along[1] / parentLength, along[2] / parentLength};
-    // A joint inside a body wrapped in clothing is inside both: the ray has to come out of each.
-    const double winding = windingNumber(mesh, joint);
-    if (winding < 0.5) continue;
-    const double exit = exitDistance(mesh, joint, direction, static_cast<int>(std::lround(winding)));
-    const double length = std::min(kTipReach * exit, kTipLengthCap * parentLength);
-    if (!(length > 0.0)) continue;
-    --placement.leavesWithoutTip;
     placement.tips.push_back({b,
                               {joint[0] + length * direction[0], joint[1] + length * direction[1],
                                joint[2] + length * direction[2]},
-                              false});
+                              fromSkeleton});
   }
   return placement;
 }

@@ -31,11 +31,12 @@ inline constexpr double kTipReach = 0.9;
 inline constexpr double kTipLengthCap = 2.5;
 
 // Places the tips. `mesh` must be oriented outward (see orientPiecesOutward) and `bones` checked. A leaf
-// takes the skeleton's own tip when it has one; otherwise a ray from its joint, continuing the direction
-// from its parent's joint, is followed until it leaves the surface, and the tip goes kTipReach of the
-// way there, never farther than kTipLengthCap parent lengths. A leaf gets no tip when it is a root,
-// when its joint lies outside the surface (the ray would start in the air), or when the ray never
-// leaves it (an open surface).
+// takes the skeleton's own tip when it has one, pulled back to kTipReach of the way to the surface if it
+// lies beyond it. Otherwise a ray from its joint, continuing the direction from its parent's joint, is
+// followed until it leaves the surface, and the tip goes kTipReach of the way there, never farther than
+// kTipLengthCap parent lengths. No tip reaches past the plane halfway to any other joint. A leaf gets no
+// cast tip when it is a root, when its joint lies outside the surface (the ray would start in the air),
+// or when the ray never leaves it (an open surface).
 TipPlacement placeLeafTips(const Mesh& mesh, const std::vector<Bone>& bones);
 
 // The generalised winding number of the surface about `point`: about 1 inside a closed outward surface,

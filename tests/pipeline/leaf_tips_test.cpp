@@ -24,14 +24,16 @@ struct TipCase {
   const char* name;
   double parentX, leafX;
   bool expectTip;
-  double expectX;  // where the tip lands along the tube
+  double expectX;      // where the tip lands along the tube
+  double otherX = -1;  // a second root's joint, when positive
 };
 
 class LeafTipPlacement : public ::testing::TestWithParam<TipCase> {};
 
 TEST_P(LeafTipPlacement, CastsAwayFromTheParentToJustInsideTheSurface) {
   const TipCase& c = GetParam();
-  const std::vector<Bone> bones = {boneAt("parent", -1, c.parentX), boneAt("leaf", 0, c.leafX)};
+  std::vector<Bone> bones = {boneAt("parent", -1, c.parentX), boneAt("leaf", 0, c.leafX)};
+  if (c.otherX > 0.0) bones.push_back(boneAt("other", -1, c.otherX));
   const TipPlacement placed = placeLeafTips(tube(), bones);
   ASSERT_EQ(placed.tips.size(), c.expectTip ? 1u : 0u);
   EXPECT_EQ(placed.leavesWithoutTip, c.expectTip ? 0u : 1u);
@@ -67,15 +69,21 @@ TEST(LeafTips, ClothingOverTheJointIsLeftBeforeTheTipStops) {
 
 TEST(LeafTips, SkeletonTipsWinAndOnlyLeavesGetTips) {
   std::vector<Bone> bones = {boneAt("root", -1, 0.2), boneAt("mid", 0, 1.0), boneAt("leaf", 1, 1.5),
-                             boneAt("lone", -1, 2.0)};
+                             boneAt("lone", -1, 0.1, -0.2)};
   bones[2].hasTip = true;
   bones[2].tip = {2.5, 0.1, 0.0};
-  const TipPlacement placed = placeLeafTips(tube(), bones);
+  TipPlacement placed = placeLeafTips(tube(), bones);
   ASSERT_EQ(placed.tips.size(), 1u);
   EXPECT_EQ(placed.tips[0].leaf, 2u);
   EXPECT_TRUE(placed.tips[0].fromSkeleton);
   EXPECT_EQ(placed.tips[0].position, (std::array<double, 3>{2.5, 0.1, 0.0}));
   EXPECT_EQ(placed.leavesWithoutTip, 1u) << "a root with no children has no direction to cast in";
+
+  // An end the file puts past the surface is pulled back inside, along the same line.
+  bones[2].tip = {3.5, 0.02, 0.01};
+  placed = placeLeafTips(tube(), bones);
+  ASSERT_EQ(placed.tips.size(), 1u);
+  EXPECT_NEAR(placed.tips[0].position[0], 1.5 + 0.9 * 1.5, 1e-6);
 }
 
 TEST(LeafTips, WindingNumberTellsInsideFromOutside) {

@@ -91,6 +91,8 @@ TEST_P(RealAssetTest, BindsWritesAndDraws) {
                                "--preview", "out.png", "--preview-size", "160"});
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_NE(r.out.find(std::string("method      ") + a.method), std::string::npos) << r.out;
+  EXPECT_EQ(r.out.find("Total (s)"), std::string::npos)
+      << "the library's stage table shows only with --verbose";
   expectConsistentSkin((dir_ / "out.glb").string(), a.bones);
   const Picture png = loadPng((dir_ / "out.png").string());
   EXPECT_EQ(png.width, 160);
@@ -123,6 +125,7 @@ TEST_F(CliTest, ObjWithSkeletonFileKeepsItsSeamVertices) {
       run({"box.obj", "--skeleton", "bones.json", "-o", "box.gltf", "--method", "heatmap"});
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_NE(r.out.find("(8 after welding seams)"), std::string::npos) << r.out;
+  EXPECT_NE(r.out.find("  leaf tips   "), std::string::npos) << r.out;
   expectConsistentSkin((dir_ / "box.gltf").string(), 2);
   EXPECT_EQ(readSkinnedGltf((dir_ / "box.gltf").string()).vertices, 24u);
 }

@@ -1,9 +1,11 @@
 #include <algorithm>
+#include <cmath>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
 
 #include <gtest/gtest.h>
+#include <tiny_gltf.h>
 #include <unistd.h>
 
 #include "asset_import.h"
@@ -73,7 +75,7 @@ TEST_F(ImportTest, GltfRoundTripKeepsSkeletonAndSpace) {
   root[3] = 1.0;
   root[7] = 2.0;
   Mat4 tip = {0, -1, 0, 1, 1, 0, 0, 3, 0, 0, 1, 0, 0, 0, 0, 1};
-  s.joints = {{"root", -1, root}, {"tip", 0, tip}};
+  s.joints = {{"root", -1, root, {}}, {"tip", 0, tip, {}}};
   SurfaceMesh m;
   m.positions = {{0, 0, 0}, {1, 0, 0}, {0, 1, 0}, {0, 0, 1}};
   m.triangles = {{0, 2, 1}, {0, 1, 3}, {0, 3, 2}, {1, 2, 3}};
@@ -97,6 +99,113 @@ TEST_F(ImportTest, GltfRoundTripKeepsSkeletonAndSpace) {
 
   // The same file with a --skeleton: the file's bones are ignored and the mesh is still read.
   EXPECT_TRUE(importAsset(path, true).skeleton.joints.empty());
+}
+
+double distance(const Vec3f& a, const Vec3f& b) { return std::hypot(a[0] - b[0], a[1] - b[1], a[2] - b[2]); }
+
+TEST_F(ImportTest, FileWeightsGiveEveryMergedVertexItsOwnBones) {
+  // BCN_Epileptic merges three meshes: their weights must land on their own stretch of vertices.
+  for (const char* file : {"X/Testwuson.X", "X/BCN_Epileptic.X", "FBX/animation_with_skeleton.fbx"}) {
+    SCOPED_TRACE(file);
+    const ImportedAsset a = importAsset(model(file), false);
+    ASSERT_TRUE(a.fileWeights.has_value());
+    const VertexWeights& w = *a.fileWeights;
+    ASSERT_EQ(w.numVertices(), a.mesh.positions.size());
+    for (std::size_t v = 0; v < w.numVertices(); ++v) {
+      ASSERT_GT(w.end(v), w.begin(v)) << "vertex " << v << " lost its weights";
+      float sum = 0.0f;
+      for (std::uint32_t i = w.begin(v); i < w.end(v); ++i) {
+        ASSERT_LT(w.influences[i].joint, a.skeleton.joints.size());
+        if (i > w.begin(v)) {
+          EXPECT_GE(w.influences[i - 1].weight, w.influences[i].weight);
+        }
+        sum += w.influences[i].weight;
+      }
+      EXPECT_NEAR(sum, 1.0f, 1e-5f) << "vertex " << v;
+    }
+  }
+  EXPECT_FALSE(importAsset(model("X/Testwuson.X"), true).fileWeights.has_value());
+}
+
+TEST_F(ImportTest, EndNodesUnderLeafBonesBecomeTheirTips) {
+  // Blender's exporter closes each chain with a "_end" node, which carries on along the chain.
+  for (const auto& [file, ends] :
+       {std::pair{"FBX/animation_with_skeleton.fbx", std::vector<std::string>{"Bone.006", "Bone.013"}},
+        std::pair{"FBX/huesitos.fbx", std::vector<std::string>{"Bone.006", "Bone.008"}}}) {
+    SCOPED_TRACE(file);
+    const ImportedAsset a = importAsset(model(file), false);
+    for (const Joint& j : a.skeleton.joints) {
+      const bool expected = std::find(ends.begin(), ends.end(), j.name) != ends.end();
+      ASSERT_EQ(j.tip.has_value(), expected) << j.name;
+      if (!expected) continue;
+      const Vec3f at = translationOf(j.bindPose), from = translationOf(a.skeleton.joints[j.parent].bindPose);
+      const double parentLength = distance(at, from), length = distance(*j.tip, at);
+      double cosine = 0.0;
+      for (int k = 0; k < 3; ++k) cosine += ((*j.tip)[k] - at[k]) * (at[k] - from[k]);
+      EXPECT_GT(cosine / (parentLength * length), 0.95) << j.name;
+      EXPECT_GT(length, 0.25 * parentLength) << j.name;
+      EXPECT_LT(length, 4.0 * parentLength) << j.name;
+    }
+  }
+}
+
+TEST_F(ImportTest, GltfEndNodesAndWeightsComeBackInBindSpace) {
+  // The leaf's frame is turned a quarter about z, so an end node one half along its local x lies one half
+  // along mesh y; a nearer end node and one on the joint itself must not win.
+  Skeleton s;
+  Mat4 root = identity(), leaf = {0, -1, 0, 1, 1, 0, 0, 3, 0, 0, 1, 0, 0, 0, 0, 1}, flat = identity();
+  root[3] = 1.0, root[7] = 2.0, flat[3] = 2.0, flat[7] = 2.0;
+  s.joints = {{"root", -1, root, {}}, {"leaf", 0, leaf, {}}, {"flat", 0, flat, {}}};
+  SurfaceMesh m;
+  m.positions = {{0, 0, 0}, {1, 0, 0}, {0, 1, 0}, {0, 0, 1}};
+  m.triangles = {{0, 2, 1}, {0, 1, 3}, {0, 3, 2}, {1, 2, 3}};
+  VertexWeights w;
+  w.offsets = {0, 1, 3, 6, 7};
+  w.influences = {{0, 1.0f}, {1, 0.75f}, {0, 0.25f}, {2, 0.5f}, {1, 0.3f}, {0, 0.2f}, {2, 1.0f}};
+  const std::string path = (dir_ / "ends.glb").string();
+  writeSkinnedGltf(path, m, s, w, true);
+
+  tinygltf::Model gltf;
+  tinygltf::TinyGLTF io;
+  std::string err, warn;
+  ASSERT_TRUE(io.LoadBinaryFromFile(&gltf, &err, &warn, path)) << err;
+  const auto addEnd = [&](const std::string& under, const char* name, std::vector<double> at) {
+    const auto parent = std::find_if(gltf.nodes.begin(), gltf.nodes.end(),
+                                     [&](const tinygltf::Node& n) { return n.name == under; });
+    ASSERT_NE(parent, gltf.nodes.end()) << under;
+    parent->children.push_back(static_cast<int>(gltf.nodes.size()));
+    tinygltf::Node end;
+    end.name = name;
+    end.translation = std::move(at);
+    gltf.nodes.push_back(end);
+  };
+  addEnd("leaf", "leaf_nub", {0.2, 0.0, 0.0});
+  addEnd("leaf", "leaf_end", {0.5, 0.0, 0.0});
+  addEnd("flat", "flat_end", {0.0, 0.0, 0.0});
+  addEnd("root", "root_helper", {0.0, 0.0, 4.0});  // not a leaf: its bone ends at its children
+  ASSERT_TRUE(io.WriteGltfSceneToFile(&gltf, path, true, true, false, true));
+
+  const ImportedAsset a = importAsset(path, false);
+  ASSERT_EQ(a.skeleton.joints.size(), 3u);
+  EXPECT_FALSE(a.skeleton.joints[0].tip.has_value());
+  ASSERT_TRUE(a.skeleton.joints[1].tip.has_value());
+  EXPECT_LT(distance(*a.skeleton.joints[1].tip, {1.0f, 3.5f, 0.0f}), 1e-5);
+  EXPECT_FALSE(a.skeleton.joints[2].tip.has_value());
+
+  ASSERT_TRUE(a.fileWeights.has_value());
+  ASSERT_EQ(a.fileWeights->numVertices(), m.positions.size());
+  for (std::size_t v = 0; v < m.positions.size(); ++v) {
+    const std::size_t was =
+        std::find(m.positions.begin(), m.positions.end(), a.mesh.positions[v]) - m.positions.begin();
+    ASSERT_LT(was, m.positions.size());
+    ASSERT_EQ(a.fileWeights->end(v) - a.fileWeights->begin(v), w.end(was) - w.begin(was)) << v;
+    for (std::uint32_t i = 0; i < w.end(was) - w.begin(was); ++i) {
+      const Influence got = a.fileWeights->influences[a.fileWeights->begin(v) + i],
+                      want = w.influences[w.begin(was) + i];
+      EXPECT_EQ(got.joint, want.joint) << v;
+      EXPECT_NEAR(got.weight, want.weight, 1e-6f) << v;
+    }
+  }
 }
 
 TEST_F(ImportTest, StaticMeshHasNoSkeletonAndKeepsItsTriangles) {

@@ -1,11 +1,14 @@
 #include "asset_import.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <cmath>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <map>
 #include <stdexcept>
+#include <utility>
 #include <vector>
 
 #include <assimp/Importer.hpp>
@@ -80,11 +83,90 @@ void orderJoints(const aiNode* node,
   const std::string name = node->mName.C_Str();
   const auto it = bindPoses.find(name);
   if (it != bindPoses.end()) {
-    skeleton.joints.push_back({name, parent, it->second});
+    skeleton.joints.push_back({name, parent, it->second, {}});
     parent = static_cast<int>(skeleton.joints.size()) - 1;
   }
   for (unsigned c = 0; c < node->mNumChildren; ++c)
     orderJoints(node->mChildren[c], parent, bindPoses, skeleton);
+}
+
+// The file's weights follow the merged numbering: each mesh's vertices start at the offset it was appended
+// at. Only meant as a reference next to a binding, so a weight naming no vertex of its mesh is dropped
+// rather than failing the import.
+VertexWeights gatherFileWeights(const std::vector<std::pair<const aiMesh*, std::uint32_t>>& merged,
+                                const Skeleton& skeleton,
+                                std::size_t numVertices) {
+  std::map<std::string, std::uint32_t> jointOf;
+  for (std::size_t j = 0; j < skeleton.joints.size(); ++j)
+    jointOf.emplace(skeleton.joints[j].name, static_cast<std::uint32_t>(j));
+  std::vector<std::vector<Influence>> rows(numVertices);
+  for (const auto& [mesh, base] : merged) {
+    for (unsigned b = 0; b < mesh->mNumBones; ++b) {
+      const aiBone* bone = mesh->mBones[b];
+      const std::uint32_t joint = jointOf.at(bone->mName.C_Str());
+      for (unsigned k = 0; k < bone->mNumWeights; ++k) {
+        const aiVertexWeight& w = bone->mWeights[k];
+        if (w.mVertexId >= mesh->mNumVertices || !(w.mWeight > 0.0f)) continue;
+        std::vector<Influence>& row = rows[base + w.mVertexId];
+        // A bone listed twice in one mesh adds up rather than naming the joint twice.
+        const auto same =
+            std::find_if(row.begin(), row.end(), [&](const Influence& i) { return i.joint == joint; });
+        if (same != row.end())
+          same->weight += w.mWeight;
+        else
+          row.push_back({joint, w.mWeight});
+      }
+    }
+  }
+  VertexWeights weights;
+  weights.offsets.reserve(numVertices + 1);
+  for (std::vector<Influence>& row : rows) {
+    float sum = 0.0f;
+    for (const Influence& i : row) sum += i.weight;
+    if (sum > 0.0f)
+      for (Influence& i : row) i.weight /= sum;
+    std::stable_sort(row.begin(), row.end(),
+                     [](const Influence& a, const Influence& b) { return a.weight > b.weight; });
+    weights.influences.insert(weights.influences.end(), row.begin(), row.end());
+    weights.offsets.push_back(static_cast<std::uint32_t>(weights.influences.size()));
+  }
+  return weights;
+}
+
+// Exporters close a chain with an end node under its last bone ("Head_end", "Toe_End", "Bip01 L Toe0Nub"):
+// not a bone, so it deforms nothing, but it is the only place the file says where that bone ends. Its
+// local transform is relative to the bone's frame, so the bone's bind pose carries it into bind space.
+void setLeafTips(const aiScene* scene,
+                 const std::map<std::string, Mat4>& bindPoses,
+                 const SurfaceMesh& mesh,
+                 Skeleton& skeleton) {
+  std::vector<bool> leaf(skeleton.joints.size(), true);
+  for (const Joint& j : skeleton.joints)
+    if (j.parent >= 0) leaf[j.parent] = false;
+  // Exporters that put the end node on the joint itself say nothing about the bone's length.
+  Vec3f lo = mesh.positions.front(), hi = lo;
+  for (const Vec3f& p : mesh.positions)
+    for (int k = 0; k < 3; ++k) lo[k] = std::min(lo[k], p[k]), hi[k] = std::max(hi[k], p[k]);
+  const double coincident = 1e-6 * std::hypot(hi[0] - lo[0], hi[1] - lo[1], hi[2] - lo[2]);
+  for (std::size_t j = 0; j < skeleton.joints.size(); ++j) {
+    if (!leaf[j]) continue;
+    Joint& joint = skeleton.joints[j];
+    const aiNode* node = scene->mRootNode->FindNode(joint.name.c_str());
+    if (node == nullptr) continue;
+    const Vec3f at = translationOf(joint.bindPose);
+    double farthest = coincident;
+    for (unsigned c = 0; c < node->mNumChildren; ++c) {
+      const aiNode* child = node->mChildren[c];
+      // A node holding a mesh is a prop the bone carries, placed wherever its author liked.
+      if (bindPoses.count(child->mName.C_Str()) > 0 || child->mNumMeshes > 0) continue;
+      const Vec3f end = translationOf(multiply(joint.bindPose, toMat4(child->mTransformation)));
+      const double distance = std::hypot(end[0] - at[0], end[1] - at[1], end[2] - at[2]);
+      if (distance > farthest) {
+        farthest = distance;
+        joint.tip = end;
+      }
+    }
+  }
 }
 
 void importSkinned(const aiScene* scene, ImportedAsset& asset) {
@@ -92,6 +174,7 @@ void importSkinned(const aiScene* scene, ImportedAsset& asset) {
   // meshes were exported in different spaces, a bone they share relates the two spaces, so each later
   // mesh is carried into the space of the first one through a bone already known.
   std::map<std::string, Mat4> bindPoses;
+  std::vector<std::pair<const aiMesh*, std::uint32_t>> merged;  // with the merged index of its first vertex
   for (unsigned m = 0; m < scene->mNumMeshes; ++m) {
     const aiMesh* mesh = scene->mMeshes[m];
     if (mesh->mNumBones == 0 || !hasTriangles(mesh)) {
@@ -110,6 +193,7 @@ void importSkinned(const aiScene* scene, ImportedAsset& asset) {
       const aiBone* bone = mesh->mBones[b];
       bindPoses.emplace(bone->mName.C_Str(), multiply(toBindSpace, inverse(toMat4(bone->mOffsetMatrix))));
     }
+    merged.emplace_back(mesh, static_cast<std::uint32_t>(asset.mesh.positions.size()));
     appendMesh(mesh, toBindSpace, asset.mesh);
     ++asset.meshesMerged;
   }
@@ -119,8 +203,11 @@ void importSkinned(const aiScene* scene, ImportedAsset& asset) {
     std::map<std::string, bool> placed;
     for (const Joint& j : asset.skeleton.joints) placed[j.name] = true;
     for (const auto& [name, pose] : bindPoses)
-      if (placed.count(name) == 0) asset.skeleton.joints.push_back({name, -1, pose});
+      if (placed.count(name) == 0) asset.skeleton.joints.push_back({name, -1, pose, {}});
   }
+  if (asset.mesh.positions.empty()) return;
+  asset.fileWeights = gatherFileWeights(merged, asset.skeleton, asset.mesh.positions.size());
+  setLeafTips(scene, bindPoses, asset.mesh, asset.skeleton);
 }
 
 void importStatic(const aiScene* scene, ImportedAsset& asset) {
