@@ -87,6 +87,11 @@ inline Point3 VectorTransform(const Matrix3& m, const Point3& v) {
           v.x * r0.z + v.y * r1.z + v.z * r2.z};
 }
 
+/// The engine's form of an affine 4x4 transform written, as hosts and file formats write it, as sixteen
+/// doubles row by row for column vectors (p' = M p, translation in elements 3, 7 and 11): column c of
+/// the 4x4 becomes row c here. The bottom row is not read.
+TESSIK_API Matrix3 Matrix3FromRowMajor4x4(const double* m);
+
 /// The inverse affine transform, computed in double precision. A singular matrix (determinant 0 or
 /// not finite) has no inverse; the identity is returned so callers never see NaN from it.
 TESSIK_API Matrix3 Inverse(const Matrix3& m);

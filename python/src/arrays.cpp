@@ -124,12 +124,4 @@ DoubleArray affineMatrices(py::handle object,
   return matrices;
 }
 
-std::array<float, 12> engineRows(const double* m) {
-  std::array<float, 12> rows{};
-  for (int axis = 0; axis < 4; ++axis) {
-    for (int k = 0; k < 3; ++k) rows[3 * axis + k] = static_cast<float>(m[4 * k + axis]);
-  }
-  return rows;
-}
-
 }  // namespace tessik::python

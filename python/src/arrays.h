@@ -51,8 +51,4 @@ DoubleArray affineMatrices(py::handle object,
                            const std::vector<py::ssize_t>& dims,
                            const char* pattern);
 
-// The engine's twelve floats for a column-vector 4x4 matrix (row-major, 16 doubles): the images of the
-// X, Y and Z axes, then the translation, because the engine multiplies row vectors from the left.
-std::array<float, 12> engineRows(const double* matrix);
-
 }  // namespace tessik::python

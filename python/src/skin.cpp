@@ -15,6 +15,8 @@ namespace tessik::python {
 
 namespace {
 
+using TessikSDK::Geom::Matrix3FromRowMajor4x4;
+
 constexpr double kIdentity[16] = {1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1};
 
 void makeReadOnly(py::array& array) { array.attr("flags").attr("writeable") = false; }
@@ -66,12 +68,11 @@ Skin::Skin(py::handle bindMatrices, py::handle boneIndices, py::handle weights, 
 
   engine_.SetNumBones(numBones_);
   engine_.SetNumPoints(numPoints_);
-  std::array<float, 12> rows = engineRows(object.data());
-  engine_.SetInitTM(rows.data());
+  engine_.SetInitTM(Matrix3FromRowMajor4x4(object.data()));
   for (int b = 0; b < numBones_; ++b) {
-    rows = engineRows(bind.data() + 16 * b);
-    engine_.SetInitBoneTM(b, rows.data());
-    engine_.SetBoneTM(b, rows.data());
+    const TessikSDK::Geom::Matrix3 m = Matrix3FromRowMajor4x4(bind.data() + 16 * b);
+    engine_.SetInitBoneTM(b, m);
+    engine_.SetBoneTM(b, m);
   }
   for (int v = 0; v < numPoints_; ++v) {
     engine_.SetPointData(v, used[static_cast<std::size_t>(v)], sizeof(std::int32_t), ids + v * columns,
@@ -90,9 +91,9 @@ py::array_t<float> Skin::deform(py::handle pointsObject, py::handle boneMatrices
   const std::string bonesPattern = "(" + std::to_string(numBones_) + ", 4, 4), one matrix per bone";
   const DoubleArray matrices =
       affineMatrices(boneMatricesObject, "bone_matrices", {numBones_, 4, 4}, bonesPattern.c_str());
-  std::vector<std::array<float, 12>> rows(static_cast<std::size_t>(numBones_));
+  std::vector<TessikSDK::Geom::Matrix3> rows(static_cast<std::size_t>(numBones_));
   for (int b = 0; b < numBones_; ++b)
-    rows[static_cast<std::size_t>(b)] = engineRows(matrices.data() + 16 * b);
+    rows[static_cast<std::size_t>(b)] = Matrix3FromRowMajor4x4(matrices.data() + 16 * b);
 
   py::array_t<float> out({static_cast<py::ssize_t>(numPoints_), py::ssize_t{3}});
   float* target = out.mutable_data();
@@ -101,7 +102,7 @@ py::array_t<float> Skin::deform(py::handle pointsObject, py::handle boneMatrices
   {
     py::gil_scoped_release release;
     std::lock_guard<std::mutex> lock(mutex_);
-    for (int b = 0; b < numBones_; ++b) engine_.SetBoneTM(b, rows[static_cast<std::size_t>(b)].data());
+    for (int b = 0; b < numBones_; ++b) engine_.SetBoneTM(b, rows[static_cast<std::size_t>(b)]);
     engine_.PreComputeBoneXFormTMs();
     tbb::parallel_for(tbb::blocked_range<int>(0, numPoints_, 4096),
                       [&](const tbb::blocked_range<int>& range) {

@@ -27,6 +27,13 @@ Matrix3 Matrix3::operator*(const Matrix3& b) const {
                  rows[3] * b);
 }
 
+Matrix3 Matrix3FromRowMajor4x4(const double* m) {
+  auto column = [&](int c) {
+    return Point3(static_cast<float>(m[c]), static_cast<float>(m[4 + c]), static_cast<float>(m[8 + c]));
+  };
+  return Matrix3(column(0), column(1), column(2), column(3));
+}
+
 Matrix3 Inverse(const Matrix3& m) {
   double a[3][3];
   for (int r = 0; r < 3; ++r)

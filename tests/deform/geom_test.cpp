@@ -36,6 +36,15 @@ TEST(GeomMatrix, FloatFormIsRowsInOrder) {
   for (int r = 0; r < 4; ++r) EXPECT_EQ(m.GetRow(r), Point3(f + 3 * r)) << "row " << r;
 }
 
+TEST(GeomMatrix, RowMajor4x4MapsPointsAsTheColumnVectorProduct) {
+  // A quarter turn about z, then a move by (1, 2, 3): (1, 0, 0) goes to (1, 3, 3).
+  const double m[16] = {0, -1, 0, 1, 1, 0, 0, 2, 0, 0, 1, 3, 0, 0, 0, 1};
+  const Matrix3 engine = TessikSDK::Geom::Matrix3FromRowMajor4x4(m);
+  expectNear(Point3(1, 0, 0) * engine, Point3(1, 3, 3));
+  expectNear(Point3(0, 1, 0) * engine, Point3(0, 2, 3));
+  expectNear(VectorTransform(engine, Point3(0, 0, 1)), Point3(0, 0, 1));
+}
+
 TEST(GeomMatrix, InverseUndoesRandomAffineTransforms) {
   std::mt19937 rng(7);
   for (int i = 0; i < 200; ++i) {

@@ -190,7 +190,8 @@ void printSummary(const BoundRun& run, std::ostream& out) {
   if (o.settings.leafTips) {
     out << "  leaf tips   " << r.tipsFromSkeleton << " from the skeleton, " << r.tipsCast << " cast";
     if (r.leavesWithoutTip > 0)
-      out << ", " << r.leavesWithoutTip << " leaves without (joint outside the surface)";
+      out << ", " << r.leavesWithoutTip
+          << " leaves without one (a lone root, or a joint outside the surface)";
     out << "\n";
   } else {
     out << "  leaf tips   off\n";

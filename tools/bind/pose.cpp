@@ -38,13 +38,7 @@ double parseAngle(const std::string& text, std::string part) {
   return value;
 }
 
-// Matrix3 keeps the axes as rows and applies to row vectors, so its row r is column r of the Mat4.
-Matrix3 toMatrix3(const Mat4& m) {
-  auto column = [&](int c) {
-    return Point3(static_cast<float>(m[c]), static_cast<float>(m[4 + c]), static_cast<float>(m[8 + c]));
-  };
-  return Matrix3(column(0), column(1), column(2), column(3));
-}
+Matrix3 toMatrix3(const Mat4& m) { return TessikSDK::Geom::Matrix3FromRowMajor4x4(m.data()); }
 
 Vec3f normalized(const std::array<double, 3>& v) {
   const double length = std::sqrt(v[0] * v[0] + v[1] * v[1] + v[2] * v[2]);
