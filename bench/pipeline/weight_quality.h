@@ -101,7 +101,7 @@ inline std::vector<Vec3d> skin(const std::vector<bind::Vec3f>& positions,
     }
     Vec3d sum{0.0, 0.0, 0.0};
     for (std::uint32_t i = weights.begin(v); i < weights.end(v); ++i) {
-      const Vec3d p = movedBy(motion[weights.influences[i].joint], positions[v]);
+      const Vec3d p = movedBy(motion[weights.influences[i].bone], positions[v]);
       for (int k = 0; k < 3; ++k) sum[k] += weights.influences[i].weight * p[k];
     }
     out[v] = sum;

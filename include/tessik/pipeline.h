@@ -104,6 +104,15 @@ struct Result {
   Report report;
 };
 
+/// The first fault of `weights` as rows for `vertexCount` vertices over `boneCount` bones, as one line,
+/// or an empty string: offsets that start at 0, never decrease and end at the influence count, one row
+/// per vertex, bones in range, finite non-negative weights; with `everyVertexWeighted`, a positive weight
+/// in every row too. Hosts check weights they were handed with it before indexing bones by them.
+TESSIK_API std::string checkWeights(const Weights& weights,
+                                    std::size_t vertexCount,
+                                    std::size_t boneCount,
+                                    bool everyVertexWeighted = false);
+
 /// Why a run gave no weights.
 class TESSIK_API BindError : public std::runtime_error {
  public:

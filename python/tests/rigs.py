@@ -150,5 +150,5 @@ def tool_bind(tmp_path, rig, method, resolution=32):
     rows = [[] for _ in vertices]
     for line in csv.read_text().splitlines()[1:]:
         vertex, bone, weight = line.split(",")
-        rows[int(vertex)].append((index[bone], np.float32(weight)))
+        rows[int(vertex)].append((index[bone], float(weight)))
     return rig._replace(vertices=vertices.copy(), triangles=triangles), rows

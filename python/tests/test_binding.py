@@ -62,8 +62,7 @@ def test_matches_the_command_line_tool(gl, tmp_path, method, rig_name):
     for v, entries in enumerate(rows):
         n = len(entries)
         assert bone_indices[v, :n].tolist() == [b for b, _ in entries], v
-        # The tool keeps weights in single precision.
-        np.testing.assert_array_equal(weights[v, :n].astype(np.float32), [w for _, w in entries])
+        np.testing.assert_array_equal(weights[v, :n], [w for _, w in entries])
         assert np.all(bone_indices[v, n:] == -1)
 
 

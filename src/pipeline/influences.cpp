@@ -1,9 +1,39 @@
 #include "pipeline/influences.h"
 
 #include <algorithm>
+#include <cmath>
 #include <limits>
+#include <string>
 
 namespace TessikSDK::Pipeline {
+
+std::string checkWeights(const Weights& weights,
+                         std::size_t vertexCount,
+                         std::size_t boneCount,
+                         bool everyVertexWeighted) {
+  const auto& offsets = weights.offsets;
+  if (offsets.empty() || offsets.front() != 0 || offsets.back() != weights.influences.size())
+    return "the weight offsets do not cover the influences";
+  if (offsets.size() != vertexCount + 1)
+    return "there are weights for " + std::to_string(offsets.size() - 1) + " vertices, but the mesh has " +
+           std::to_string(vertexCount);
+  for (std::size_t v = 0; v < vertexCount; ++v) {
+    if (offsets[v] > offsets[v + 1]) return "the weight offsets decrease at vertex " + std::to_string(v);
+    bool weighted = false;
+    for (std::uint32_t i = offsets[v]; i < offsets[v + 1]; ++i) {
+      const Influence& in = weights.influences[i];
+      if (in.bone >= boneCount)
+        return "vertex " + std::to_string(v) + " names bone " + std::to_string(in.bone) + " of " +
+               std::to_string(boneCount);
+      if (!std::isfinite(in.weight) || in.weight < 0.0)
+        return "vertex " + std::to_string(v) + " has weight " + std::to_string(in.weight);
+      weighted = weighted || in.weight > 0.0;
+    }
+    if (everyVertexWeighted && !weighted)
+      return "vertex " + std::to_string(v) + " has no influence with a positive weight";
+  }
+  return {};
+}
 
 Weights foldAndLimit(const Weights& nodeWeights,
                      const std::vector<std::uint32_t>& boneOfNode,

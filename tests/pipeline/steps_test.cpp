@@ -131,3 +131,26 @@ TEST(Orphans, TakeTheNearestJointWholly) {
 
 }  // namespace
 }  // namespace TessikSDK::Pipeline
+
+namespace TessikSDK::Pipeline {
+namespace {
+
+TEST(CheckWeights, NamesTheFirstFaultOfAWeightTable) {
+  // Three vertices over two bones; the middle vertex has no influence.
+  const Weights good = rows({{{0, 1.0}}, {}, {{1, 0.25}, {0, 0.75}}});
+  EXPECT_EQ(checkWeights(good, 3, 2), "");
+  EXPECT_EQ(checkWeights(good, 3, 2, true), "vertex 1 has no influence with a positive weight");
+  EXPECT_EQ(checkWeights(good, 4, 2), "there are weights for 3 vertices, but the mesh has 4");
+  EXPECT_EQ(checkWeights(good, 3, 1), "vertex 2 names bone 1 of 1");
+  Weights bad = good;
+  bad.influences[1].weight = -0.25;
+  EXPECT_EQ(checkWeights(bad, 3, 2), "vertex 2 has weight -0.250000");
+  bad = good;
+  bad.offsets = {0, 2, 1, 3};
+  EXPECT_EQ(checkWeights(bad, 3, 2), "the weight offsets decrease at vertex 1");
+  bad.offsets = {0, 1, 1};
+  EXPECT_EQ(checkWeights(bad, 2, 2), "the weight offsets do not cover the influences");
+}
+
+}  // namespace
+}  // namespace TessikSDK::Pipeline

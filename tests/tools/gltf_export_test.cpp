@@ -188,7 +188,7 @@ TEST_P(GltfRoundTrip, ReadsBackMeshSkeletonAndWeights) {
     std::map<int, double> expected;
     double total = 0.0, sum = 0.0;
     for (std::uint32_t i = rig.weights.begin(v); i < rig.weights.end(v); ++i) {
-      expected[rig.weights.influences[i].joint] += rig.weights.influences[i].weight;
+      expected[rig.weights.influences[i].bone] += rig.weights.influences[i].weight;
       total += rig.weights.influences[i].weight;
     }
     // Vertices 0 and 4 each have one influence too light to keep.
@@ -241,7 +241,7 @@ TEST_F(GltfExport, RefusesBrokenInputWithoutWritingAFile) {
   unweighted.influences.erase(unweighted.influences.begin(), unweighted.influences.begin() + first);
   for (std::uint32_t& offset : unweighted.offsets) offset -= std::min(offset, first);
   cases[1].first = "joint out of range";
-  cases[1].second.weights.influences[0].joint = 6;
+  cases[1].second.weights.influences[0].bone = 6;
   cases[2].first = "weights for fewer vertices";
   cases[2].second.mesh.positions.push_back({0, 0, 0});
   cases[2].second.mesh.normals.push_back({0, 0, 1});
@@ -262,7 +262,7 @@ TEST_F(CsvExport, ListsEveryInfluenceByQuotedName) {
   Skeleton skeleton;
   skeleton.joints = {{"root", -1, identity()}, {"arm, \"left\"", 0, identity()}};
   VertexWeights weights;
-  weights.influences = {{0, 1}, {1, 0.75f}, {0, 0.1f}};
+  weights.influences = {{0, 1}, {1, 0.75}, {0, 0.1}};
   weights.offsets = {0, 1, 1, 3};
   const std::string path = file("w.csv");
   writeWeightsCsv(path, skeleton, weights);
@@ -270,7 +270,7 @@ TEST_F(CsvExport, ListsEveryInfluenceByQuotedName) {
   text << std::ifstream(path).rdbuf();
   EXPECT_EQ(text.str(), "vertex,bone,weight\n0,root,1\n2,\"arm, \"\"left\"\"\",0.75\n2,root,0.1\n");
 
-  weights.influences[2].joint = 2;
+  weights.influences[2].bone = 2;
   EXPECT_THROW(writeWeightsCsv(file("bad.csv"), skeleton, weights), std::invalid_argument);
   EXPECT_FALSE(fs::exists(file("bad.csv")));
 }

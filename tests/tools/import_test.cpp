@@ -115,7 +115,7 @@ TEST_F(ImportTest, FileWeightsGiveEveryMergedVertexItsOwnBones) {
       ASSERT_GT(w.end(v), w.begin(v)) << "vertex " << v << " lost its weights";
       float sum = 0.0f;
       for (std::uint32_t i = w.begin(v); i < w.end(v); ++i) {
-        ASSERT_LT(w.influences[i].joint, a.skeleton.joints.size());
+        ASSERT_LT(w.influences[i].bone, a.skeleton.joints.size());
         if (i > w.begin(v)) {
           EXPECT_GE(w.influences[i - 1].weight, w.influences[i].weight);
         }
@@ -202,7 +202,7 @@ TEST_F(ImportTest, GltfEndNodesAndWeightsComeBackInBindSpace) {
     for (std::uint32_t i = 0; i < w.end(was) - w.begin(was); ++i) {
       const Influence got = a.fileWeights->influences[a.fileWeights->begin(v) + i],
                       want = w.influences[w.begin(was) + i];
-      EXPECT_EQ(got.joint, want.joint) << v;
+      EXPECT_EQ(got.bone, want.bone) << v;
       EXPECT_NEAR(got.weight, want.weight, 1e-6f) << v;
     }
   }

@@ -167,7 +167,7 @@ TEST_F(DeformChain, RejectsInputsThatDoNotFit) {
         s.weights.offsets.pop_back();
         s.weights.influences.pop_back();
       },
-      [](SkinInputs& s) { s.weights.influences[0].joint = 3; },
+      [](SkinInputs& s) { s.weights.influences[0].bone = 3; },
       [](SkinInputs& s) { s.weights.influences[0].weight = -1.0f; },
       [](SkinInputs& s) {
         s.mesh.normals = {{0, 0, 1}};

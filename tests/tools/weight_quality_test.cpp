@@ -83,12 +83,12 @@ TEST(WeightQuality, TheBaselineGivesASegmentToTheBoneThatSwingsIt) {
   ASSERT_EQ(w.numVertices(), 3u);
   for (std::uint32_t v = 0; v < 3; ++v) {
     ASSERT_EQ(w.end(v) - w.begin(v), 1u);
-    EXPECT_EQ(w.influences[w.begin(v)].joint, v);
+    EXPECT_EQ(w.influences[w.begin(v)].bone, v);
     EXPECT_EQ(w.influences[w.begin(v)].weight, 1.0f);
   }
   // Without its tip the toe is only its joint, where the knee's segment ends: past it, the knee wins.
   s.joints[2].tip.reset();
-  EXPECT_EQ(nearestBoneWeights(points, s).influences[2].joint, 1u);
+  EXPECT_EQ(nearestBoneWeights(points, s).influences[2].bone, 1u);
 }
 
 TEST(WeightQuality, PercentilesInterpolateBetweenRanks) {

@@ -6,6 +6,8 @@
 #include <string>
 #include <vector>
 
+#include <tessik/pipeline.h>
+
 // What the binding tool carries between its stages: the surface as the file had it, the skeleton in the
 // same space, and the weights the binding gave each vertex.
 namespace tessik::bind {
@@ -45,20 +47,9 @@ struct SurfaceMesh {
   std::vector<std::array<std::uint32_t, 3>> triangles;
 };
 
-struct Influence {
-  std::uint32_t joint = 0;  // index into Skeleton::joints
-  float weight = 0.0f;
-};
-
-// Compressed rows: the influences of vertex v are influences[offsets[v]] .. influences[offsets[v + 1] - 1],
-// sorted by decreasing weight. A vertex may have none.
-struct VertexWeights {
-  std::vector<std::uint32_t> offsets{0};
-  std::vector<Influence> influences;
-
-  std::size_t numVertices() const { return offsets.size() - 1; }
-  std::uint32_t begin(std::size_t v) const { return offsets[v]; }
-  std::uint32_t end(std::size_t v) const { return offsets[v + 1]; }
-};
+// The library's own per-vertex influences: compressed rows, strongest first, `bone` indexing
+// Skeleton::joints. A vertex may have none.
+using Influence = TessikSDK::Pipeline::Influence;
+using VertexWeights = TessikSDK::Pipeline::Weights;
 
 }  // namespace tessik::bind

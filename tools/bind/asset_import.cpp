@@ -110,7 +110,7 @@ VertexWeights gatherFileWeights(const std::vector<std::pair<const aiMesh*, std::
         std::vector<Influence>& row = rows[base + w.mVertexId];
         // A bone listed twice in one mesh adds up rather than naming the joint twice.
         const auto same =
-            std::find_if(row.begin(), row.end(), [&](const Influence& i) { return i.joint == joint; });
+            std::find_if(row.begin(), row.end(), [&](const Influence& i) { return i.bone == joint; });
         if (same != row.end())
           same->weight += w.mWeight;
         else

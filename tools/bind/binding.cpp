@@ -37,13 +37,7 @@ BoundAsset bindAsset(const SurfaceMesh& mesh,
   }
   pl::Result result = pl::bindSkin(surface, bones, pipelineOptions(settings), progress);
 
-  BoundAsset bound;
-  bound.report = std::move(result.report);
-  bound.weights.offsets = std::move(result.weights.offsets);
-  bound.weights.influences.reserve(result.weights.influences.size());
-  for (const pl::Influence& in : result.weights.influences)
-    bound.weights.influences.push_back({in.bone, static_cast<float>(in.weight)});
-  return bound;
+  return {std::move(result.weights), std::move(result.report)};
 }
 
 }  // namespace tessik::bind

@@ -23,23 +23,12 @@ std::string csvField(const std::string& text) {
   return quoted + '"';
 }
 
-void checkWeights(const Skeleton& skeleton, const VertexWeights& weights) {
-  const auto& offsets = weights.offsets;
-  if (offsets.empty() || offsets.front() != 0 || offsets.back() != weights.influences.size())
-    throw std::invalid_argument("the weight offsets do not cover the influences");
-  for (std::size_t v = 0; v + 1 < offsets.size(); ++v)
-    if (offsets[v] > offsets[v + 1])
-      throw std::invalid_argument("the weight offsets decrease at vertex " + std::to_string(v));
-  for (const Influence& influence : weights.influences)
-    if (influence.joint >= skeleton.joints.size())
-      throw std::invalid_argument("an influence names joint " + std::to_string(influence.joint) + " of " +
-                                  std::to_string(skeleton.joints.size()));
-}
-
 }  // namespace
 
 void writeWeightsCsv(const std::string& path, const Skeleton& skeleton, const VertexWeights& weights) {
-  checkWeights(skeleton, weights);
+  const std::string fault = TessikSDK::Pipeline::checkWeights(
+      weights, weights.offsets.empty() ? 0 : weights.numVertices(), skeleton.joints.size());
+  if (!fault.empty()) throw std::invalid_argument(fault);
 
   std::vector<std::string> names;
   names.reserve(skeleton.joints.size());
@@ -55,7 +44,7 @@ void writeWeightsCsv(const std::string& path, const Skeleton& skeleton, const Ve
     for (std::uint32_t i = weights.begin(v); i < weights.end(v); ++i) {
       const Influence& influence = weights.influences[i];
       const auto end = std::to_chars(number, number + sizeof number, influence.weight).ptr;
-      out << v << ',' << names[influence.joint] << ',' << std::string_view(number, end - number) << '\n';
+      out << v << ',' << names[influence.bone] << ',' << std::string_view(number, end - number) << '\n';
     }
   out.close();
   if (!out) {

@@ -88,28 +88,10 @@ void checkMesh(const SurfaceMesh& mesh) {
         throw badInput("triangle " + std::to_string(t) + " uses vertex " + std::to_string(index));
 }
 
-void checkWeights(const VertexWeights& weights, std::size_t numVertices, std::size_t numJoints) {
-  const auto& offsets = weights.offsets;
-  if (offsets.size() != numVertices + 1)
-    throw badInput("weights for " + std::to_string(offsets.empty() ? 0 : offsets.size() - 1) +
-                   " vertices, the mesh has " + std::to_string(numVertices));
-  if (offsets.front() != 0 || offsets.back() != weights.influences.size())
-    throw badInput("the weight offsets do not cover the influences");
-  for (std::size_t v = 0; v < numVertices; ++v) {
-    if (offsets[v] > offsets[v + 1])
-      throw badInput("the weight offsets decrease at vertex " + std::to_string(v));
-    bool weighted = false;
-    for (std::uint32_t i = offsets[v]; i < offsets[v + 1]; ++i) {
-      const Influence& influence = weights.influences[i];
-      if (influence.joint >= numJoints)
-        throw badInput("vertex " + std::to_string(v) + " names joint " + std::to_string(influence.joint) +
-                       " of " + std::to_string(numJoints));
-      if (!(influence.weight >= 0.0f) || !std::isfinite(influence.weight))
-        throw badInput("vertex " + std::to_string(v) + " has weight " + std::to_string(influence.weight));
-      weighted = weighted || influence.weight > 0.0f;
-    }
-    if (!weighted) throw badInput("vertex " + std::to_string(v) + " has no influence with a positive weight");
-  }
+void requireBlendableWeights(const VertexWeights& weights, std::size_t numVertices, std::size_t numJoints) {
+  // A glTF skin blends every vertex, so each needs some weight.
+  const std::string fault = TessikSDK::Pipeline::checkWeights(weights, numVertices, numJoints, true);
+  if (!fault.empty()) throw badInput(fault);
 }
 
 // Per vertex: its influences as (joint, weight in kWeightUnits), one per joint, summing to kWeightUnits.
@@ -127,7 +109,7 @@ QuantisedWeights quantiseWeights(const VertexWeights& weights) {
     merged.clear();
     for (std::uint32_t i = weights.begin(v); i < weights.end(v); ++i)
       if (weights.influences[i].weight > 0.0f)
-        merged.emplace_back(weights.influences[i].joint, weights.influences[i].weight);
+        merged.emplace_back(weights.influences[i].bone, weights.influences[i].weight);
     // glTF forbids naming a joint twice for one vertex: add up such repeats.
     std::sort(merged.begin(), merged.end());
     std::size_t unique = 0;
@@ -440,7 +422,7 @@ void writeSkinnedGltf(const std::string& path,
                       bool binary) {
   checkSkeleton(skeleton);
   checkMesh(mesh);
-  checkWeights(weights, mesh.positions.size(), skeleton.joints.size());
+  requireBlendableWeights(weights, mesh.positions.size(), skeleton.joints.size());
 
   ModelBuilder builder;
   tinygltf::Model& model = builder.model();

@@ -140,23 +140,9 @@ void checkSkinInputs(const SurfaceMesh& mesh,
     for (std::uint32_t corner : t)
       if (corner >= n)
         badInput("a triangle uses vertex " + std::to_string(corner) + " of " + std::to_string(n));
-  if (weights.offsets.empty() || weights.offsets.front() != 0 ||
-      weights.offsets.back() != weights.influences.size())
-    badInput("the weight rows do not cover the influence list");
-  if (weights.numVertices() != n)
-    badInput("there are weights for " + std::to_string(weights.numVertices()) +
-             " vertices, but the mesh has " + std::to_string(n));
-  for (std::size_t v = 0; v < n; ++v)
-    if (weights.begin(v) > weights.end(v))
-      badInput("the weight rows of vertex " + std::to_string(v) + " overlap");
   const std::size_t numJoints = skeleton.joints.size();
-  for (const Influence& influence : weights.influences) {
-    if (influence.joint >= numJoints)
-      badInput("a weight names joint " + std::to_string(influence.joint) + " of " +
-               std::to_string(numJoints));
-    if (!std::isfinite(influence.weight) || influence.weight < 0.0f)
-      badInput("a weight is negative or not finite");
-  }
+  const std::string fault = TessikSDK::Pipeline::checkWeights(weights, n, numJoints);
+  if (!fault.empty()) badInput(fault);
   if (jointTransforms.size() != numJoints)
     badInput("there are " + std::to_string(jointTransforms.size()) + " joint transforms for " +
              std::to_string(numJoints) + " joints");
@@ -196,7 +182,7 @@ SurfaceMesh deformMesh(const SurfaceMesh& mesh,
     for (std::uint32_t i = begin; i < end; ++i) total += weights.influences[i].weight;
     if (!(total > 0.0)) continue;
     for (std::uint32_t i = begin; i < end; ++i) {
-      boneIDs[i] = static_cast<int>(weights.influences[i].joint);
+      boneIDs[i] = static_cast<int>(weights.influences[i].bone);
       boneWeights[i] = static_cast<float>(weights.influences[i].weight / total);
     }
     engine.SetPointData(v, static_cast<int>(end - begin), sizeof(int), &boneIDs[begin], sizeof(float),

@@ -233,7 +233,7 @@ std::vector<Vec3f> shadedColours(const SurfaceMesh& mesh, const VertexWeights& w
     float total = 0.0f;
     for (std::uint32_t i = weights.begin(v); i < weights.end(v); ++i) {
       const Influence& influence = weights.influences[i];
-      const Vec3f c = jointColour(influence.joint);
+      const Vec3f c = jointColour(influence.bone);
       for (int k = 0; k < 3; ++k) sum[k] += influence.weight * c[k];
       total += influence.weight;
     }
