@@ -6,18 +6,13 @@
 #include "tessik/pipeline.h"
 
 #include "meshes/mesh_builders.h"
+#include "pipeline/bones.h"
 #include "support/gl_context_fixture.h"
 
 namespace TessikSDK::Pipeline {
 namespace {
 
-Bone boneAt(const char* name, int parent, double x) {
-  Bone b;
-  b.name = name;
-  b.parent = parent;
-  b.bindPose = {1, 0, 0, x, 0, 1, 0, 0.02, 0, 0, 1, 0.01, 0, 0, 0, 1};
-  return b;
-}
+Bone boneAt(const char* name, int parent, double x) { return Pipeline::boneAt(name, parent, x, 0.02, 0.01); }
 
 Mesh tube(float length) {
   const tessik::meshes::TriMesh m = tessik::meshes::cylinderX(0.0f, length, 0.0f, 0.0f, 0.3f, 24, 16);

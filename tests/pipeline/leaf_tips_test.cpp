@@ -3,21 +3,19 @@
 #include <gtest/gtest.h>
 
 #include "meshes/mesh_builders.h"
+#include "pipeline/bones.h"
 
 namespace TessikSDK::Pipeline {
 namespace {
 
 Mesh toMesh(const tessik::meshes::TriMesh& m) { return {m.positions, m.triangles}; }
 
+// Joints just off the tube's axis, so that casts along it cross faces rather than the caps' centres.
 Bone boneAt(const char* name, int parent, double x, double y = 0.02, double z = 0.01) {
-  Bone b;
-  b.name = name;
-  b.parent = parent;
-  b.bindPose = {1, 0, 0, x, 0, 1, 0, y, 0, 0, 1, z, 0, 0, 0, 1};
-  return b;
+  return Pipeline::boneAt(name, parent, x, y, z);
 }
 
-// A tube along x from 0 to 3, its axis nudged off the cap's centre vertex so the casts meet faces.
+// A tube along x from 0 to 3 around the x axis.
 Mesh tube() { return toMesh(tessik::meshes::cylinderX(0.0f, 3.0f, 0.0f, 0.0f, 0.3f, 12, 16)); }
 
 struct TipCase {

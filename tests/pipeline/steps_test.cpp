@@ -5,18 +5,11 @@
 
 #include "tessik/pipeline.h"
 
+#include "pipeline/bones.h"
 #include "pipeline/influences.h"
 
 namespace TessikSDK::Pipeline {
 namespace {
-
-Bone boneAt(const char* name, int parent, double x, double y = 0.0, double z = 0.0) {
-  Bone b;
-  b.name = name;
-  b.parent = parent;
-  b.bindPose = {1, 0, 0, x, 0, 1, 0, y, 0, 0, 1, z, 0, 0, 0, 1};
-  return b;
-}
 
 struct BadInput {
   const char* name;
