@@ -107,6 +107,20 @@ TEST_P(BindSkinGeodesic, SeamsAndInsideOutPiecesBindAsTheCleanSurface) {
     }
 }
 
+// A tail of three bones, the last a leaf: with its tip the end of the tail swings with the last bone
+// alone, as an animator expects when only the tip is turned.
+TEST_P(BindSkinGeodesic, TailTipFollowsTheLastBone) {
+  const Mesh mesh = tube(3.0f);
+  const std::vector<Bone> bones = {boneAt("tail1", -1, 0.1), boneAt("tail2", 0, 1.0),
+                                   boneAt("tail3", 1, 1.9)};
+  const Result result = bindSkin(mesh, bones, options);
+  EXPECT_EQ(result.report.tipsCast, 1u);
+  for (std::size_t v = 0; v < mesh.positions.size(); ++v)
+    if (mesh.positions[v][0] > 2.3f) {
+      EXPECT_GE(weightOf(result.weights, v, 2), 0.9) << v;
+    }
+}
+
 TEST_P(BindSkinGeodesic, RebindingGivesTheSameWeightsAndConsoleStaysQuiet) {
   const Mesh mesh = tube(3.0f);
   const std::vector<Bone> bones = {boneAt("a", -1, 0.3), boneAt("b", 0, 1.5)};

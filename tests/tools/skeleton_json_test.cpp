@@ -9,7 +9,7 @@ namespace {
 
 TEST(SkeletonJsonTest, OrdersParentsFirstAndReadsBothFrameForms) {
   const Skeleton s = parseSkeletonJson(R"([
-    {"name": "hand", "parent": "arm", "position": [2, 0, 0]},
+    {"name": "hand", "parent": "arm", "position": [2, 0, 0], "tip": [2.5, 0, 0]},
     {"name": "arm", "parent": "root", "matrix": [0,-1,0,1, 1,0,0,0, 0,0,1,0, 0,0,0,1]},
     {"name": "root", "parent": null, "position": [0, 0, 0]},
     {"name": "tail", "position": [-1, 0, 0]}
@@ -27,6 +27,8 @@ TEST(SkeletonJsonTest, OrdersParentsFirstAndReadsBothFrameForms) {
   EXPECT_EQ(s.joints[2].bindPose[3], 1.0);
   EXPECT_EQ(translationOf(s.joints[3].bindPose), (Vec3f{2, 0, 0}));
   EXPECT_EQ(s.joints[3].bindPose[0], 1.0);
+  EXPECT_EQ(s.joints[3].tip, (Vec3f{2.5f, 0, 0}));
+  EXPECT_FALSE(s.joints[2].tip.has_value());
 }
 
 struct BadSkeleton {
@@ -59,6 +61,7 @@ INSTANTIATE_TEST_SUITE_P(
         BadSkeleton{"[{\"name\": \"a\"}]", "neither matrix nor position"},
         BadSkeleton{"[{\"name\": \"a\", \"matrix\": [1,0,0]}]", "matrix needs 16 numbers"},
         BadSkeleton{"[{\"name\": \"a\", \"position\": [0,\"x\",0]}]", "position needs 3 finite numbers"},
+        BadSkeleton{"[{\"name\": \"a\", \"position\": [0,0,0], \"tip\": [1,0]}]", "tip needs 3 numbers"},
         BadSkeleton{"[{\"name\": \"a\", \"parent\": \"b\", \"position\": [0,0,0]}]",
                     "bone 'a' names unknown parent 'b'"},
         BadSkeleton{"[{\"name\": \"a\", \"position\": [0,0,0]}, {\"name\": \"a\", \"position\": [1,0,0]}]",
