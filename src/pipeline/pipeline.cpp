@@ -27,17 +27,21 @@ struct Disposer {
 template <typename T>
 using Owned = std::unique_ptr<T, Disposer<T>>;
 
-// Passes everything on to the host and keeps each phase's wall time for the report.
+// Passes everything on to the host and keeps each phase's wall time for the report. A method may begin
+// a phase while another is open (the geodesic method's voxelizing runs straight into extraction); the
+// open one ends there.
 class PhaseClock final : public gb::IProgress {
  public:
   explicit PhaseClock(gb::IProgress& inner) : inner_(inner) {}
   void begin(const char* title, int total, int start) override {
+    close();
     title_ = title != nullptr ? title : "";
     began_ = Clock::now();
+    open_ = true;
     inner_.begin(title, total, start);
   }
   void end() override {
-    phases.emplace_back(title_, std::chrono::duration<double>(Clock::now() - began_).count());
+    close();
     inner_.end();
   }
   void setRange(int total, int start) override { inner_.setRange(total, start); }
@@ -47,9 +51,15 @@ class PhaseClock final : public gb::IProgress {
   std::vector<std::pair<std::string, double>> phases;
 
  private:
+  void close() {
+    if (open_) phases.emplace_back(title_, std::chrono::duration<double>(Clock::now() - began_).count());
+    open_ = false;
+  }
+
   gb::IProgress& inner_;
   std::string title_;
   Clock::time_point began_;
+  bool open_ = false;
 };
 
 // Forwards only cancellation, so that binding many groups one by one does not flood the host's display.

@@ -1,5 +1,8 @@
+#include <algorithm>
 #include <iostream>
 #include <sstream>
+#include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -128,6 +131,11 @@ TEST_P(BindSkinGeodesic, RebindingGivesTheSameWeightsAndConsoleStaysQuiet) {
   const Result first = bindSkin(mesh, bones, options);
   const Result second = bindSkin(mesh, bones, options);
   EXPECT_EQ(::testing::internal::GetCapturedStdout(), "");
+  // Every phase is timed, the one the method runs straight out of too.
+  std::vector<std::string> phases;
+  for (const auto& [title, seconds] : first.report.phases) phases.push_back(title);
+  EXPECT_NE(std::find(phases.begin(), phases.end(), "Voxelizing model ... "), phases.end());
+  EXPECT_EQ(phases.back(), "Finishing weights");
   ASSERT_EQ(first.weights.offsets, second.weights.offsets);
   for (std::size_t i = 0; i < first.weights.influences.size(); ++i) {
     EXPECT_EQ(first.weights.influences[i].bone, second.weights.influences[i].bone);
