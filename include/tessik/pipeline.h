@@ -86,9 +86,12 @@ struct Weights {
 struct Report {
   std::size_t weldedVertices = 0;
   std::size_t pieces = 0;
-  std::size_t turnedPieces = 0;    ///< wound inside out, turned for binding
-  bool boundByPiece = false;       ///< the whole surface failed, so its pieces were bound in groups
-  std::size_t unboundPieces = 0;   ///< pieces that took their weights from the nearest bound vertex
+  std::size_t turnedPieces = 0;   ///< wound inside out, turned for binding
+  bool boundByPiece = false;      ///< the whole surface failed, so its pieces were bound in groups
+  std::size_t unboundPieces = 0;  ///< pieces no group binding reached
+  /// Of those, the ones with bones inside them, given wholly to those bones; the rest took the weights
+  /// of the nearest bound vertex.
+  std::size_t piecesGivenEnclosedBones = 0;
   std::size_t orphanVertices = 0;  ///< vertices no binding reached, given their nearest joint
   std::size_t tipsFromSkeleton = 0;
   std::size_t tipsCast = 0;

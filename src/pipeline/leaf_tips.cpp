@@ -85,18 +85,26 @@ double reachBeforeOtherJoints(const std::vector<Bone>& bones,
 
 }  // namespace
 
-double windingNumber(const Mesh& mesh, const Vec3& point) {
+double windingNumber(const std::vector<std::array<float, 3>>& positions,
+                     const std::vector<std::array<std::uint32_t, 3>>& triangles,
+                     const Vec3& point) {
+  auto corner = [&](std::uint32_t v) {
+    return Vec3{positions[v][0] - point[0], positions[v][1] - point[1], positions[v][2] - point[2]};
+  };
   // Each triangle adds the solid angle it spans as seen from the point (van Oosterom and Strackee).
   double total = 0.0;
-  for (const auto& tri : mesh.triangles) {
-    const Vec3 a = sub(corner(mesh, tri[0]), point), b = sub(corner(mesh, tri[1]), point),
-               c = sub(corner(mesh, tri[2]), point);
+  for (const auto& tri : triangles) {
+    const Vec3 a = corner(tri[0]), b = corner(tri[1]), c = corner(tri[2]);
     const double la = norm(a), lb = norm(b), lc = norm(c);
     const double numerator = dot(a, cross(b, c));
     const double denominator = la * lb * lc + dot(a, b) * lc + dot(b, c) * la + dot(c, a) * lb;
     total += 2.0 * std::atan2(numerator, denominator);
   }
   return total / (4.0 * M_PI);
+}
+
+double windingNumber(const Mesh& mesh, const Vec3& point) {
+  return windingNumber(mesh.positions, mesh.triangles, point);
 }
 
 TipPlacement placeLeafTips(const Mesh& mesh, const std::vector<Bone>& bones) {

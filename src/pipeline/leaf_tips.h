@@ -42,5 +42,9 @@ TipPlacement placeLeafTips(const Mesh& mesh, const std::vector<Bone>& bones);
 // The generalised winding number of the surface about `point`: about 1 inside a closed outward surface,
 // 0 outside, in between near holes.
 double windingNumber(const Mesh& mesh, const std::array<double, 3>& point);
+// The same over some of the mesh's triangles (one piece, say).
+double windingNumber(const std::vector<std::array<float, 3>>& positions,
+                     const std::vector<std::array<std::uint32_t, 3>>& triangles,
+                     const std::array<double, 3>& point);
 
 }  // namespace TessikSDK::Pipeline

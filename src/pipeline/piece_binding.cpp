@@ -32,6 +32,7 @@ class PieceBinder {
     for (std::uint32_t p = 0; p < vertices_.size(); ++p)
       if (!triangles_[p].empty()) all.push_back(p);
     result_.unboundPieces = vertices_.size() - all.size();
+    result_.pieceBound.assign(vertices_.size(), false);
     progress_.begin("Binding the pieces in groups", static_cast<int>(all.size()), 0);
     if (all.size() > 1) {
       split(all, 0, all.size());
@@ -83,6 +84,7 @@ class PieceBinder {
     }
     const Weights w = bindGroup_(group);
     if (w.numVertices() == 0) return false;
+    for (std::size_t i = first; i < last; ++i) result_.pieceBound[pieces[i]] = true;
     for (std::size_t i = first; i < last; ++i)
       for (std::uint32_t v : vertices_[pieces[i]]) {
         perVertex_[v].assign(w.influences.begin() + w.begin(local_[v]),

@@ -12,6 +12,7 @@ namespace TessikSDK::Pipeline {
 struct PieceBinding {
   Weights weights;                // no vertices when no piece could be bound, or on cancel
   std::size_t unboundPieces = 0;  // pieces that failed even alone, or had no triangle
+  std::vector<bool> pieceBound;   // per piece: whether a group holding it was bound
 };
 
 // Binds one group of whole pieces; answers no vertices when the group cannot be bound.

@@ -8,6 +8,7 @@
 #include <string>
 #include <utility>
 
+#include "pipeline/enclosed_bones.h"
 #include "pipeline/influences.h"
 #include "pipeline/input_check.h"
 #include "pipeline/leaf_tips.h"
@@ -204,6 +205,7 @@ Result bindSkin(const Mesh& mesh,
     throw BindError(BindError::Kind::noOpenGL,
                     "no OpenGL 2.1 context is current on this thread, and the binding context needs one for "
                     "either method");
+  std::vector<bool> unboundPiece;
   Weights nodeWeights = bindOnce(*context, welded.mesh, nodes, options, methodLimit, clock);
   cancelled();
   if (nodeWeights.numVertices() == 0 && report.pieces > 1) {
@@ -216,6 +218,7 @@ Result bindSkin(const Mesh& mesh,
     nodeWeights = std::move(byPiece.weights);
     report.boundByPiece = true;
     report.unboundPieces = byPiece.unboundPieces;
+    for (bool bound : byPiece.pieceBound) unboundPiece.push_back(!bound);
   }
   if (nodeWeights.numVertices() == 0)
     throw BindError(BindError::Kind::noWeights,
@@ -225,6 +228,9 @@ Result bindSkin(const Mesh& mesh,
   Weights finished;
   phase("Finishing weights", [&] {
     finished = foldAndLimit(nodeWeights, boneOfNode, options.maxInfluences);
+    if (report.unboundPieces > 0)
+      report.piecesGivenEnclosedBones =
+          giveEnclosedBones(welded.mesh, pieceOf, unboundPiece, bones, tips.tips, finished);
     report.orphanVertices = giveOrphansNearestJoint(welded.mesh, bones, finished);
     for (std::size_t v = 0; v < finished.numVertices(); ++v)
       report.maxInfluences = std::max<std::size_t>(report.maxInfluences, finished.end(v) - finished.begin(v));

@@ -198,8 +198,11 @@ void printSummary(const BoundRun& run, std::ostream& out) {
   }
   if (r.boundByPiece) {
     out << "  by piece    the whole surface could not be bound, so its pieces were bound in groups";
-    if (r.unboundPieces > 0)
-      out << "; " << r.unboundPieces << " saw no bone and took the weights of the nearest bound piece";
+    if (r.piecesGivenEnclosedBones > 0)
+      out << "; " << r.piecesGivenEnclosedBones << " saw no bone and went wholly to the bones inside them";
+    if (r.unboundPieces > r.piecesGivenEnclosedBones)
+      out << "; " << r.unboundPieces - r.piecesGivenEnclosedBones
+          << " saw no bone and took the weights of the nearest bound piece";
     out << "\n";
   }
   out << "  influences  mean " << std::fixed << std::setprecision(2) << r.meanInfluences << ", max "
