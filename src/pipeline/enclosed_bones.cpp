@@ -5,6 +5,8 @@
 #include <limits>
 #include <utility>
 
+#include "pipeline/influences.h"
+
 namespace TessikSDK::Pipeline {
 namespace {
 
@@ -85,19 +87,7 @@ std::size_t giveEnclosedBones(const Mesh& mesh,
       }
     }
   }
-  if (given == 0) return 0;
-  Weights out;
-  out.offsets.reserve(weights.offsets.size());
-  for (std::size_t v = 0; v < weights.numVertices(); ++v) {
-    if (owner[v] >= 0) {
-      out.influences.push_back({static_cast<std::uint32_t>(owner[v]), 1.0});
-    } else {
-      out.influences.insert(out.influences.end(), weights.influences.begin() + weights.begin(v),
-                            weights.influences.begin() + weights.end(v));
-    }
-    out.offsets.push_back(static_cast<std::uint32_t>(out.influences.size()));
-  }
-  weights = std::move(out);
+  if (given > 0) giveWholly(owner, weights);
   return given;
 }
 

@@ -68,33 +68,40 @@ Weights foldAndLimit(const Weights& nodeWeights,
   return out;
 }
 
-std::size_t giveOrphansNearestJoint(const Mesh& mesh, const std::vector<Bone>& bones, Weights& weights) {
-  std::size_t orphans = 0;
-  Weights filled;
-  filled.offsets.reserve(weights.offsets.size());
+void giveWholly(const std::vector<std::int64_t>& owner, Weights& weights) {
+  Weights out;
+  out.offsets.reserve(weights.offsets.size());
   for (std::size_t v = 0; v < weights.numVertices(); ++v) {
-    if (weights.begin(v) == weights.end(v)) {
-      ++orphans;
-      std::uint32_t best = 0;
-      double bestDistance = std::numeric_limits<double>::infinity();
-      for (std::uint32_t b = 0; b < bones.size(); ++b) {
-        const auto& m = bones[b].bindPose;
-        const double dx = m[3] - mesh.positions[v][0], dy = m[7] - mesh.positions[v][1],
-                     dz = m[11] - mesh.positions[v][2];
-        const double d = dx * dx + dy * dy + dz * dz;
-        if (d < bestDistance) {
-          bestDistance = d;
-          best = b;
-        }
-      }
-      filled.influences.push_back({best, 1.0});
+    if (owner[v] >= 0) {
+      out.influences.push_back({static_cast<std::uint32_t>(owner[v]), 1.0});
     } else {
-      filled.influences.insert(filled.influences.end(), weights.influences.begin() + weights.begin(v),
-                               weights.influences.begin() + weights.end(v));
+      out.influences.insert(out.influences.end(), weights.influences.begin() + weights.begin(v),
+                            weights.influences.begin() + weights.end(v));
     }
-    filled.offsets.push_back(static_cast<std::uint32_t>(filled.influences.size()));
+    out.offsets.push_back(static_cast<std::uint32_t>(out.influences.size()));
   }
-  weights = std::move(filled);
+  weights = std::move(out);
+}
+
+std::size_t giveOrphansNearestJoint(const Mesh& mesh, const std::vector<Bone>& bones, Weights& weights) {
+  std::vector<std::int64_t> owner(weights.numVertices(), -1);
+  std::size_t orphans = 0;
+  for (std::size_t v = 0; v < weights.numVertices(); ++v) {
+    if (weights.begin(v) != weights.end(v)) continue;
+    ++orphans;
+    double bestDistance = std::numeric_limits<double>::infinity();
+    for (std::uint32_t b = 0; b < bones.size(); ++b) {
+      const auto& m = bones[b].bindPose;
+      const double dx = m[3] - mesh.positions[v][0], dy = m[7] - mesh.positions[v][1],
+                   dz = m[11] - mesh.positions[v][2];
+      const double d = dx * dx + dy * dy + dz * dz;
+      if (d < bestDistance) {
+        bestDistance = d;
+        owner[v] = b;
+      }
+    }
+  }
+  if (orphans > 0) giveWholly(owner, weights);
   return orphans;
 }
 

@@ -16,6 +16,9 @@ Weights foldAndLimit(const Weights& nodeWeights,
                      const std::vector<std::uint32_t>& boneOfNode,
                      unsigned maxInfluences);
 
+// Rows of vertices with an owner (>= 0) become that one bone at full weight; the others stay.
+void giveWholly(const std::vector<std::int64_t>& owner, Weights& weights);
+
 // A vertex no binding reached (a loose vertex, a piece nothing could bind) still needs a weight: it
 // follows the nearest joint, which is what a user would paint by hand first. Answers how many there were.
 std::size_t giveOrphansNearestJoint(const Mesh& mesh, const std::vector<Bone>& bones, Weights& weights);
