@@ -3,6 +3,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <stdexcept>
 #include <string>
 #include <utility>
@@ -141,5 +142,21 @@ TESSIK_API Result bindSkin(const Mesh& mesh,
                            GeomBind::IProgress* progress = nullptr);
 
 using GeomBind::NullProgress;
+
+/// Progress and cancellation as plain callables, for hosts that would rather not implement
+/// GeomBind::IProgress. Either may be empty. Both may be called from the binding's worker threads, so
+/// they must be thread-safe.
+struct Callbacks {
+  /// A phase's name (as the library titles it) and how far it is, from 0 when it begins to 1 when it ends.
+  std::function<void(const std::string& phase, double fraction)> progress;
+  /// True to stop the run, which then throws BindError::Kind::cancelled.
+  std::function<bool()> cancelled;
+};
+
+/// As above, reporting through `callbacks`.
+TESSIK_API Result bindSkin(const Mesh& mesh,
+                           const std::vector<Bone>& bones,
+                           const Options& options,
+                           const Callbacks& callbacks);
 
 }  // namespace TessikSDK::Pipeline

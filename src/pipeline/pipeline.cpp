@@ -4,6 +4,7 @@
 #include <chrono>
 #include <cmath>
 #include <memory>
+#include <mutex>
 #include <set>
 #include <string>
 #include <utility>
@@ -75,6 +76,57 @@ class CancelOnly final : public gb::IProgress {
 
  private:
   gb::IProgress& inner_;
+};
+
+// Callbacks seen as the library's progress object. The phase's range arrives with its start, and
+// update() comes from worker threads while begin() comes from the binding thread, hence the lock.
+class CallbackProgress final : public gb::IProgress {
+ public:
+  explicit CallbackProgress(const Callbacks& callbacks) : callbacks_(callbacks) {}
+  void begin(const char* title, int total, int start) override {
+    {
+      const std::lock_guard<std::mutex> lock(mutex_);
+      phase_ = title != nullptr ? title : "";
+      total_ = total;
+      start_ = start;
+    }
+    report(0.0);
+  }
+  void end() override { report(1.0); }
+  void setRange(int total, int start) override {
+    const std::lock_guard<std::mutex> lock(mutex_);
+    total_ = total;
+    start_ = start;
+  }
+  bool update(int value) override {
+    double fraction = 0.0;
+    {
+      const std::lock_guard<std::mutex> lock(mutex_);
+      if (total_ > start_)
+        fraction =
+            std::clamp(static_cast<double>(value - start_) / static_cast<double>(total_ - start_), 0.0, 1.0);
+    }
+    report(fraction);
+    return false;
+  }
+  bool isCanceled() override { return callbacks_.cancelled && callbacks_.cancelled(); }
+
+ private:
+  void report(double fraction) {
+    if (!callbacks_.progress) return;
+    std::string phase;
+    {
+      const std::lock_guard<std::mutex> lock(mutex_);
+      phase = phase_;
+    }
+    callbacks_.progress(phase, fraction);
+  }
+
+  const Callbacks& callbacks_;
+  std::mutex mutex_;
+  std::string phase_;
+  int total_ = 0;
+  int start_ = 0;
 };
 
 // One node of the binding hierarchy: a caller's bone, or a leaf tip that stands for its leaf.
@@ -240,6 +292,14 @@ Result bindSkin(const Mesh& mesh,
   });
   report.phases = std::move(clock.phases);
   return result;
+}
+
+Result bindSkin(const Mesh& mesh,
+                const std::vector<Bone>& bones,
+                const Options& options,
+                const Callbacks& callbacks) {
+  CallbackProgress progress(callbacks);
+  return bindSkin(mesh, bones, options, &progress);
 }
 
 }  // namespace TessikSDK::Pipeline

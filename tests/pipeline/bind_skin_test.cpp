@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <iostream>
+#include <mutex>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -168,6 +169,38 @@ TEST_P(BindSkinGeodesic, CancelledRunThrowsRatherThanReturningPartialWeights) {
   CancelAtOnce cancel;
   try {
     bindSkin(tube(3.0f), {boneAt("a", -1, 0.3)}, options, &cancel);
+    FAIL() << "returned";
+  } catch (const BindError& e) {
+    EXPECT_EQ(e.kind(), BindError::Kind::cancelled);
+  }
+}
+
+TEST_P(BindSkinGeodesic, CallbacksSeeEveryPhaseAndCanStopTheRun) {
+  const Mesh mesh = tube(3.0f);
+  const std::vector<Bone> bones = {boneAt("a", -1, 0.3), boneAt("b", 0, 1.5)};
+  std::mutex mutex;
+  std::vector<std::string> phases;
+  bool inRange = true;
+  Callbacks callbacks;
+  callbacks.progress = [&](const std::string& phase, double fraction) {
+    const std::lock_guard<std::mutex> lock(mutex);
+    if (phases.empty() || phases.back() != phase) phases.push_back(phase);
+    inRange = inRange && fraction >= 0.0 && fraction <= 1.0;
+  };
+  const Result reported = bindSkin(mesh, bones, options, callbacks);
+  EXPECT_TRUE(inRange);
+  ASSERT_GE(phases.size(), 4u);
+  EXPECT_EQ(phases.front(), "Welding seams and orienting pieces");
+  EXPECT_EQ(phases.back(), "Finishing weights");
+  EXPECT_EQ(reported.weights.offsets, bindSkin(mesh, bones, options).weights.offsets);
+
+  int asked = 0;
+  callbacks.cancelled = [&] {
+    const std::lock_guard<std::mutex> lock(mutex);
+    return ++asked > 3;
+  };
+  try {
+    bindSkin(mesh, bones, options, callbacks);
     FAIL() << "returned";
   } catch (const BindError& e) {
     EXPECT_EQ(e.kind(), BindError::Kind::cancelled);
