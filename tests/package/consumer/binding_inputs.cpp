@@ -2,6 +2,7 @@
 #include <cstdio>
 
 #include <tessik/geombind.h>
+#include <tessik/pipeline.h>
 
 int checkBindingInputs() {
   using namespace TessikSDK::GeomBind;
@@ -21,5 +22,15 @@ int checkBindingInputs() {
     return 1;
   }
   std::printf("binding inputs created and disposed\n");
+
+  // The pipeline's header must stand alone once installed, and its error must be catchable by type.
+  try {
+    TessikSDK::Pipeline::bindSkin({}, {}, TessikSDK::Pipeline::Options{});
+    std::fprintf(stderr, "binding an empty mesh did not throw\n");
+    return 1;
+  } catch (const TessikSDK::Pipeline::BindError& e) {
+    if (e.kind() != TessikSDK::Pipeline::BindError::Kind::invalidInput) return 1;
+    std::printf("empty mesh refused: %s\n", e.what());
+  }
   return 0;
 }
