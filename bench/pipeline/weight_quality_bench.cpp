@@ -188,8 +188,6 @@ void printTable(const std::vector<Asset>& assets) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  // The geodesic method's stage table would land in the middle of the benchmark's own output.
-  TessikSDK::GeomBind::setConsoleReports(false);
   const std::vector<Asset> assets = loadAssets();
   registerAll(assets);
   const int status = tessik::bench::runBenchmarks(argc, argv);

@@ -62,6 +62,10 @@ struct Options {
   /// cast from the leaf joint away from its parent to just inside the surface. Tips never appear in
   /// the result: their weights go to their leaf.
   bool leafTips = true;
+  /// Let the library print its stage table and phase lines to standard output during this call. Off, a
+  /// binding says nothing on the console; the process-wide GeomBind::setConsoleReports switch is set
+  /// for the call and put back after it.
+  bool verbose = false;
 };
 
 /// The first fault of `options` as one line naming the option, or an empty string.

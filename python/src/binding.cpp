@@ -62,23 +62,9 @@ pl::Options pipelineOptions(const BindOptions& options) {
   o.resolution = static_cast<int>(options.resolution);
   o.refineInterior = options.refineInterior;
   o.leafTips = options.leafTips;
+  o.verbose = options.verbose;
   return o;
 }
-
-// The library's stage table and phase lines go to stdout, which in Python is the user's notebook or log:
-// shown only when asked for, and the process-wide switch is put back afterwards.
-class GeomBindConsole {
- public:
-  explicit GeomBindConsole(bool verbose) : before_(TessikSDK::GeomBind::consoleReports()) {
-    TessikSDK::GeomBind::setConsoleReports(verbose);
-  }
-  ~GeomBindConsole() { TessikSDK::GeomBind::setConsoleReports(before_); }
-  GeomBindConsole(const GeomBindConsole&) = delete;
-  GeomBindConsole& operator=(const GeomBindConsole&) = delete;
-
- private:
-  bool before_;
-};
 
 void readVertices(py::handle object, BindInput& in) {
   const py::array raw = asArray(object, "vertices");
@@ -163,27 +149,7 @@ std::vector<std::int64_t> readParents(py::handle object, std::size_t boneCount) 
                                                      std::to_string(count));
     }
   }
-  // Walk up from every bone; meeting a bone still on the current walk means a cycle.
-  enum : char { kUnseen, kOnWalk, kDone };
-  std::vector<char> state(boneCount, kUnseen);
-  for (std::size_t b = 0; b < boneCount; ++b) {
-    std::vector<std::int64_t> walk;
-    std::int64_t j = static_cast<std::int64_t>(b);
-    while (j != -1 && state[static_cast<std::size_t>(j)] == kUnseen) {
-      state[static_cast<std::size_t>(j)] = kOnWalk;
-      walk.push_back(j);
-      j = out[static_cast<std::size_t>(j)];
-    }
-    if (j != -1 && state[static_cast<std::size_t>(j)] == kOnWalk) {
-      std::string cycle = std::to_string(j);
-      for (std::int64_t k = out[static_cast<std::size_t>(j)]; k != j; k = out[static_cast<std::size_t>(k)]) {
-        cycle += " -> " + std::to_string(k);
-      }
-      fail("parents", "do not form a forest: bones " + cycle + " -> " + std::to_string(j) +
-                          " form a cycle; every chain of parents must end at a root (-1)");
-    }
-    for (std::int64_t k : walk) state[static_cast<std::size_t>(k)] = kDone;
-  }
+  // Whether they form a forest is the binding pipeline's check, which every front end shares.
   return out;
 }
 
@@ -230,12 +196,11 @@ BindOutput run(const BindInput& in, const BindOptions& options, ProgressBridge& 
   BindOutput out;
   // Declared before the binding so that it outlives the binding context the pipeline makes in it.
   std::optional<support::HeadlessGLContext> headless;
-  std::string why;
-  if (!support::ensureGLContext(headless, &why)) {
-    out.status = BindOutput::Status::NoOpenGL;
-    out.message = why.empty() ? "no headless OpenGL context could be made" : why;
-    return out;
-  }
+  // Without a context the pipeline still checks the input first, so bad arguments are reported as such;
+  // the reason no context could be made replaces its plainer message below.
+  std::string noContext;
+  if (!support::ensureGLContext(headless, &noContext) && noContext.empty())
+    noContext = "no headless OpenGL context could be made";
   pl::Mesh mesh;
   mesh.positions.resize(in.vertexCount());
   for (std::size_t v = 0; v < in.vertexCount(); ++v)
@@ -249,7 +214,6 @@ BindOutput run(const BindInput& in, const BindOptions& options, ProgressBridge& 
     bones[b].bindPose = in.matrices[b];
   }
 
-  const GeomBindConsole console(options.verbose);
   pl::Result result;
   try {
     result = pl::bindSkin(mesh, bones, pipelineOptions(options), &progress);
@@ -259,7 +223,7 @@ BindOutput run(const BindInput& in, const BindOptions& options, ProgressBridge& 
                  : e.kind() == Kind::noOpenGL     ? BindOutput::Status::NoOpenGL
                  : e.kind() == Kind::invalidInput ? BindOutput::Status::Invalid
                                                   : BindOutput::Status::Empty;
-    out.message = e.what();
+    out.message = e.kind() == Kind::noOpenGL && !noContext.empty() ? noContext : e.what();
     return out;
   }
   // A cancelled run may still hand back weights; none of them is to reach the caller.

@@ -218,6 +218,13 @@ Result bindSkin(const Mesh& mesh,
   for (const std::string& fault : {validateOptions(options), checkMesh(mesh), checkBones(bones)})
     if (!fault.empty()) throw BindError(BindError::Kind::invalidInput, fault);
 
+  // The library's console output belongs to the host's terminal or log, not to every call.
+  struct ConsoleReports {
+    explicit ConsoleReports(bool enabled) : before(gb::consoleReports()) { gb::setConsoleReports(enabled); }
+    ~ConsoleReports() { gb::setConsoleReports(before); }
+    bool before;
+  } console(options.verbose);
+
   NullProgress silent;
   PhaseClock clock(progress != nullptr ? *progress : silent);
   auto phase = [&](const char* title, auto&& work) {

@@ -90,19 +90,6 @@ const std::vector<OutputKind>& outputKinds() {
   return kinds;
 }
 
-// The library prints its stage table only when asked; restored afterwards, for hosts that run the tool
-// in-process (the tests do).
-class ConsoleReports {
- public:
-  explicit ConsoleReports(bool enabled) : before_(gb::consoleReports()) { gb::setConsoleReports(enabled); }
-  ~ConsoleReports() { gb::setConsoleReports(before_); }
-  ConsoleReports(const ConsoleReports&) = delete;
-  ConsoleReports& operator=(const ConsoleReports&) = delete;
-
- private:
-  bool before_;
-};
-
 std::string seconds(double s) {
   std::ostringstream os;
   os << std::fixed << std::setprecision(s < 10 ? 2 : 1) << s << " s";
@@ -261,7 +248,6 @@ int runBindTool(const ToolOptions& options,
     err << "tessik-bind: " << invalid << "\n";
     return kExitUsage;
   }
-  const ConsoleReports console(o.verbose);
   std::vector<std::pair<std::string, double>> times;
   auto timed = [&](const char* stage, auto&& work) {
     const Clock::time_point t0 = Clock::now();

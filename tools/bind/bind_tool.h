@@ -21,7 +21,6 @@ struct ToolOptions {
   int previewSize = 800;
   BindSettings settings;
   std::vector<JointRotation> pose;  // applied before the preview is drawn
-  bool verbose = false;             // let the library print its own progress lines and stage table
 };
 
 // Exit statuses of the tool.

@@ -14,6 +14,7 @@ pl::Options pipelineOptions(const BindSettings& settings) {
   options.maxInfluences = settings.maxInfluences;
   options.refineInterior = settings.refineInterior;
   options.leafTips = settings.leafTips;
+  options.verbose = settings.verbose;
   return options;
 }
 

@@ -19,6 +19,7 @@ struct BindSettings {
   unsigned maxInfluences = 4;  // 0 keeps every influence
   bool refineInterior = false;
   bool leafTips = true;
+  bool verbose = false;  // let the library print its own phase lines and stage table
 };
 
 const char* methodName(BindMethod method);

@@ -68,7 +68,7 @@ int main(int argc, char** argv) {
       "--no-leaf-tips", noLeafTips,
       "bind leaf bones (a head, a hand without fingers) by their joint alone, without a tip of their "
       "own");
-  app.add_flag("--verbose", options.verbose,
+  app.add_flag("--verbose", options.settings.verbose,
                "let the library print its own progress lines and stage timings");
   app.add_option("--csv", options.csvPath, "also write vertex,bone,weight rows");
   app.add_option("--preview", options.previewPath, "also draw the bound mesh, coloured by bone, into a PNG");
