@@ -1,19 +1,17 @@
-// Cost of a whole heat-map binding of a character-like mesh (30 bones) at about 10k and 50k vertices,
-// split by stage. The target is the 50k bind in under 15 s on a two-core machine.
+// Cost of a whole heat-map binding: a 500-vertex tube on a chain of five bones, and a character-like
+// mesh (30 bones) at about 10k and 50k vertices, split by stage. The targets on a two-core machine: the
+// tube in 50 ms and 80 MB, the 50k character in 1 s and 250 MB.
 //
 // BM_HeatmapBind times HeatmapBind::bind alone (falloff 0.5, four influences). Each iteration binds a
 // fresh copy of the mesh and hierarchy, prepared and given normals untimed, because preparation changes
 // both in place and the bind moves joints that sit on vertices. Counters:
 //   - split_*: seconds per stage of one further bind, rebuilt step by step from the stage functions the
 //     bind calls, after the timed iterations so it cannot disturb them. The bind offers no hooks, so
-//     this is the only way to see inside it. split_ordering is part of split_factor, timed by a second,
-//     separate ordering of the same matrix; split_solves is solveHeat less the assembly and
-//     factorisation it repeats; split_octree_free is the octree's teardown, which the bind pays on
-//     return. split_rest is the timed mean less split_total: mapping sources to bones, truncating and
-//     normalising, but also the allocator's state, so it swings either way by a few hundred ms, and the
-//     first bind in a process pays page faults on the octree's memory that later ones do not;
-//   - octants: nodes in the bind's octree, which sets its build and teardown cost and most of the
-//     memory;
+//     this is the only way to see inside it. split_index is building the triangle index that decides
+//     line of sight; split_ordering is part of split_factor, timed by a second, separate ordering of the
+//     same matrix; split_solves is solveHeat less the assembly and factorisation it repeats. split_rest
+//     is the timed mean less split_total: mapping sources to bones, truncating and normalising, and the
+//     allocator's state;
 //   - peak_rss_mib: the process's resident high-water mark after the timed iterations. It never goes
 //     down, so the sizes are registered in ascending order and each reading belongs to the largest run
 //     yet;
@@ -40,7 +38,7 @@
 #include "geombind/algorithm/heatmap/heat_sources.h"
 #include "geombind/algorithm/heatmap/heat_system.h"
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
-#include "geombind/collision/octree.h"
+#include "geombind/collision/occlusion_index.h"
 #include "geombind/mesh.h"
 #include "geombind/preparation.h"
 #include "geombind/transform_hierarchy.h"
@@ -68,8 +66,23 @@ struct Character {
   HierarchyData hierarchy;
 };
 
+// A closed tube along x with 5 bones in a chain down its axis: 502 vertices.
+meshes::Character Tube() {
+  meshes::Character tube;
+  tube.mesh = meshes::cylinderX(0.0f, 5.0f, 0.0f, 0.0f, 0.4f, 24, 20);
+  const char* names[] = {"b0", "b1", "b2", "b3", "b4"};
+  for (int b = 0; b < 5; ++b) {
+    meshes::Bone bone;
+    bone.name = names[b];
+    bone.parent = b == 0 ? "" : names[b - 1];
+    bone.position = {0.5f + static_cast<float>(b), 0.0f, 0.0f};
+    tube.bones.push_back(bone);
+  }
+  return tube;
+}
+
 Character MakeCharacter(double detail) {
-  const meshes::Character source = meshes::character(detail);
+  const meshes::Character source = detail == 0.0 ? Tube() : meshes::character(detail);
   MeshImpl mesh;
   for (const meshes::Vec3& p : source.mesh.positions) mesh.addVertex(p[0], p[1], p[2]);
   for (const auto& t : source.mesh.triangles) mesh.addTriangle(t[0], t[1], t[2]);
@@ -103,28 +116,18 @@ double SecondsSince(Clock::time_point start) {
 
 struct Split {
   double areas = 0.0;
-  double octree = 0.0;
+  double index = 0.0;
   double sources = 0.0;  // collecting them and pushing bones off vertices
   double visibility = 0.0;
   double assemble = 0.0;
   double factor = 0.0;
   double ordering = 0.0;
   double solves = 0.0;
-  double octreeFree = 0.0;
   std::size_t heatSources = 0;
-  std::size_t octants = 0;
   bool ok = false;
 
-  double total() const {
-    return areas + octree + sources + visibility + assemble + factor + solves + octreeFree;
-  }
+  double total() const { return areas + index + sources + visibility + assemble + factor + solves; }
 };
-
-std::size_t CountOctants(const Collision::Octant& octant) {
-  std::size_t count = 1;
-  for (const Collision::Octant* child : octant.children) count += CountOctants(*child);
-  return count;
-}
 
 // The bind's steps one by one, in its order and with its parameters.
 Split MeasureSplit(const Character& character) {
@@ -138,24 +141,16 @@ Split MeasureSplit(const Character& character) {
   if (areas.empty()) return split;
 
   start = Clock::now();
-  auto ownedOctree = std::make_unique<Collision::Octree>();
-  Collision::Octree& octree = *ownedOctree;
-  octree.reset(mesh.boundingBox);
-  for (const TriangleRecord& t : mesh.triangles) {
-    auto corner = [&](int k) {
-      const auto& p = mesh.vertices[t[k]].position;
-      return glm::dvec3(p[0], p[1], p[2]);
-    };
-    octree.insert(new Collision::OctreeElement<Collision::Triangle>(
-        Collision::Triangle(corner(0), corner(1), corner(2))));
-  }
-  octree.build(0, 10);
-  split.octree = SecondsSince(start);
-  split.octants = CountOctants(octree);
+  std::vector<Collision::Triangle> triangles;
+  triangles.reserve(mesh.triangles.size());
+  for (const TriangleRecord& t : mesh.triangles)
+    triangles.push_back(TessikSDK::GeomBind::triangleOf(mesh, t));
+  const Collision::OcclusionIndex index(mesh.boundingBox, std::move(triangles), Algorithm::kOcclusionDepth);
+  split.index = SecondsSince(start);
 
   start = Clock::now();
   const Algorithm::HeatSources sources = Algorithm::collectHeatSources(c.hierarchy);
-  const glm::dvec3 halfDiagonal = (octree.bounds.upper - octree.bounds.lower) * 0.5;
+  const glm::dvec3 halfDiagonal = (index.bounds().upper - index.bounds().lower) * 0.5;
   const auto pushDistance =
       static_cast<float>(static_cast<double>(0.05f) * std::sqrt(glm::dot(halfDiagonal, halfDiagonal)));
   Algorithm::pushBonesOffVertices(mesh, c.hierarchy, pushDistance);
@@ -164,7 +159,8 @@ Split MeasureSplit(const Character& character) {
 
   start = Clock::now();
   const Algorithm::SourceVisibility visibility = Algorithm::computeSourceVisibility(
-      mesh, c.hierarchy, octree, sources, static_cast<double>(kFalloff), pushDistance);
+      mesh, c.hierarchy, [&index](const Collision::Segment& seg) { return index.blocked(seg); }, sources,
+      static_cast<double>(kFalloff), pushDistance);
   split.visibility = SecondsSince(start);
   if (!visibility.anyVisible) return split;
 
@@ -191,21 +187,16 @@ Split MeasureSplit(const Character& character) {
   const bool solved = Algorithm::solveHeat(mesh, areas, visibility, weights);
   split.solves = SecondsSince(start) - split.assemble - split.factor;
   split.ok = solved;
-
-  // The bind frees its octree on return; with millions of octants that is not free.
-  start = Clock::now();
-  ownedOctree.reset();
-  split.octreeFree = SecondsSince(start);
   return split;
 }
 
 struct Size {
-  int kiloVertices;  // the name the run carries
-  double detail;
+  int kiloVertices;  // the name the run carries; 0 for the tube
+  double detail;     // of the character; 0 for the tube
   int iterations;
 };
 
-constexpr std::array<Size, 2> kSizes = {Size{10, 0.4, 2}, Size{50, 2.0, 1}};
+constexpr std::array<Size, 3> kSizes = {Size{0, 0.0, 20}, Size{10, 0.4, 3}, Size{50, 2.0, 3}};
 
 void BM_HeatmapBind(benchmark::State& state) {
   const Size* size = nullptr;
@@ -262,15 +253,13 @@ void BM_HeatmapBind(benchmark::State& state) {
   const double meanBind = bindSeconds / static_cast<double>(state.iterations());
 
   state.counters["split_areas"] = split.areas;
-  state.counters["split_octree"] = split.octree;
+  state.counters["split_index"] = split.index;
   state.counters["split_sources"] = split.sources;
   state.counters["split_visibility"] = split.visibility;
   state.counters["split_assemble"] = split.assemble;
   state.counters["split_factor"] = split.factor;
   state.counters["split_ordering"] = split.ordering;
   state.counters["split_solves"] = split.solves;
-  state.counters["split_octree_free"] = split.octreeFree;
-  state.counters["octants"] = static_cast<double>(split.octants);
   state.counters["split_total"] = split.total();
   state.counters["split_rest"] = meanBind - split.total();
   state.counters["peak_rss_mib"] = peakRss;

@@ -2,7 +2,6 @@
 
 #include <atomic>
 #include <limits>
-#include <unordered_set>
 
 #include <glm/geometric.hpp>
 
@@ -17,35 +16,6 @@ glm::dvec3 bonePosition(const HierarchyData& hierarchy, std::uint32_t bone) {
   const Matrix4& m = hierarchy.transforms[bone];
   return {m[12], m[13], m[14]};
 }
-
-// Walks the leaves a segment passes through and stops at the first triangle its line crosses.
-class SegmentIntersector : public Collision::IOctreeConstVisitor {
- public:
-  explicit SegmentIntersector(const Collision::Segment& s) : segment(&s) {}
-
-  void visit(const Collision::Octant& octant) override {
-    if (hit || !Collision::intersects(octant.bounds, *segment)) return;
-    if (!octant.children.empty()) {
-      for (const auto& child : octant.children) child->accept(*this);
-      return;
-    }
-    for (const Collision::IOctreeElement* element : octant.elements) {
-      // A triangle listed in several leaves is tested once.
-      if (!tested.insert(element).second) continue;
-      // This octree holds mesh triangles only.
-      const auto& triangle =
-          static_cast<const Collision::OctreeElement<Collision::Triangle>*>(element)->primitive;
-      if (Collision::intersects(*segment, triangle)) {
-        hit = true;
-        return;
-      }
-    }
-  }
-
-  const Collision::Segment* segment;
-  std::unordered_set<const Collision::IOctreeElement*> tested;
-  bool hit = false;
-};
 
 }  // namespace
 
@@ -67,15 +37,9 @@ HeatSources collectHeatSources(const HierarchyData& hierarchy) {
 
 double distanceMeasure(double d, double falloff) { return (d * d - d) * falloff + d; }
 
-bool lineOfSightBlocked(const Collision::Octree& triangles, const Collision::Segment& segment) {
-  SegmentIntersector intersector(segment);
-  triangles.accept(intersector);
-  return intersector.hit;
-}
-
 SourceVisibility computeSourceVisibility(const MeshData& mesh,
                                          const HierarchyData& hierarchy,
-                                         const Collision::Octree& octree,
+                                         const SightBlocked& blocked,
                                          const HeatSources& sources,
                                          double falloff,
                                          float pushDistance) {
@@ -128,7 +92,7 @@ SourceVisibility computeSourceVisibility(const MeshData& mesh,
       // A source still on the vertex (no normal to push along) has no direction to be seen from.
       if (!(length > 0.0)) continue;
       if (!(glm::dot(toVertex / length, n) > 0.5)) continue;
-      if (lineOfSightBlocked(octree, Collision::Segment(p, q))) continue;
+      if (blocked(Collision::Segment(p, q))) continue;
       result.visible[v * sourceCount + e] = 1;
       anyVisible.store(true, std::memory_order_relaxed);
     }

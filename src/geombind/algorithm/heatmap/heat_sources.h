@@ -1,10 +1,11 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <utility>
 #include <vector>
 
-#include "geombind/collision/octree.h"
+#include "geombind/collision/primitives.h"
 #include "geombind/mesh.h"
 #include "geombind/transform_hierarchy.h"
 
@@ -39,13 +40,17 @@ struct SourceVisibility {
   }
 };
 
+/// Whether the mesh hides a source point from a vertex: the segment runs from the vertex to the point.
+/// Called from several threads at once.
+using SightBlocked = std::function<bool(const Collision::Segment&)>;
+
 /// Fills every distance and decides visibility of each vertex's nearest sources: the vertex normal must
-/// face away from the source point by less than 60 degrees, and no mesh triangle may cross the line
-/// between them. A source point on the vertex itself is pushed `pushDistance` inside along the normal; a
-/// vertex without a normal sees nothing there. Parallel over vertices.
+/// face away from the source point by less than 60 degrees, and `blocked` must not hide the point. A
+/// source point on the vertex itself is pushed `pushDistance` inside along the normal; a vertex without a
+/// normal sees nothing there. Parallel over vertices.
 SourceVisibility computeSourceVisibility(const MeshData& mesh,
                                          const HierarchyData& hierarchy,
-                                         const Collision::Octree& octree,
+                                         const SightBlocked& blocked,
                                          const HeatSources& sources,
                                          double falloff,
                                          float pushDistance);
@@ -53,9 +58,5 @@ SourceVisibility computeSourceVisibility(const MeshData& mesh,
 /// Moves every bone that sits exactly on a mesh vertex by -pushDistance along that vertex's normal, in
 /// the hierarchy itself.
 void pushBonesOffVertices(const MeshData& mesh, HierarchyData& hierarchy, float pushDistance);
-
-/// Whether a mesh triangle crosses the line through `a` and `b` within the octree leaves the segment
-/// a-b passes through. Each triangle is tested once.
-bool lineOfSightBlocked(const Collision::Octree& triangles, const Collision::Segment& segment);
 
 }  // namespace TessikSDK::GeomBind::Algorithm

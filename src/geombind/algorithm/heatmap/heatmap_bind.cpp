@@ -1,14 +1,15 @@
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
 
+#include <algorithm>
 #include <cmath>
-#include <map>
+#include <utility>
 
 #include <glm/geometric.hpp>
 
 #include "geombind/algorithm/heatmap/heat_sources.h"
 #include "geombind/algorithm/heatmap/heat_system.h"
 #include "geombind/algorithm/weight_lists.h"
-#include "geombind/collision/octree.h"
+#include "geombind/collision/occlusion_index.h"
 
 namespace TessikSDK::GeomBind::Algorithm {
 
@@ -70,36 +71,46 @@ VertexWeights HeatmapBind::bind(const MeshData& mesh,
 
   progress.begin("Computing Heatmap weights ... ", 6, 0);
   progress.update(0);
-  Collision::Octree octree;
-  bool octreeBuilt = false;
+  Collision::OcclusionIndex triangles;
+  bool indexed = false;
   if (!progress.isCanceled()) {
-    octree.reset(mesh.boundingBox);
-    for (const TriangleRecord& t : mesh.triangles) {
-      octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
-    }
-    octree.build(0, 10);
-    octreeBuilt = true;
+    std::vector<Collision::Triangle> list;
+    list.reserve(mesh.triangles.size());
+    for (const TriangleRecord& t : mesh.triangles) list.push_back(triangleOf(mesh, t));
+    // Sight is decided by the triangles that share a depth-10 octree leaf with the segment; the index
+    // answers that without building the octree, whose size follows the surface area in leaf cells.
+    triangles = Collision::OcclusionIndex(mesh.boundingBox, std::move(list), kOcclusionDepth);
+    indexed = true;
   }
 
   progress.update(1);
   HeatSources sources;
   if (!progress.isCanceled()) sources = collectHeatSources(hierarchy);
-  // A twentieth of the half diagonal of the octree box: enough to leave the surface, small next to a limb.
+  // A twentieth of the half diagonal of the padded mesh box: enough to leave the surface, small next to a
+  // limb.
   const glm::dvec3 halfDiagonal =
-      octreeBuilt ? (octree.bounds.upper - octree.bounds.lower) * 0.5 : glm::dvec3(0.0);
+      indexed ? (triangles.bounds().upper - triangles.bounds().lower) * 0.5 : glm::dvec3(0.0);
   const auto pushDistance =
       static_cast<float>(static_cast<double>(0.05f) * std::sqrt(glm::dot(halfDiagonal, halfDiagonal)));
   pushBonesOffVertices(mesh, hierarchy, pushDistance);
   SourceVisibility visibility;
   if (!progress.isCanceled()) {
-    visibility = computeSourceVisibility(mesh, hierarchy, octree, sources,
-                                         static_cast<double>(options->falloff), pushDistance);
+    visibility = computeSourceVisibility(
+        mesh, hierarchy, [&triangles](const Collision::Segment& s) { return triangles.blocked(s); }, sources,
+        static_cast<double>(options->falloff), pushDistance);
   }
-  if (!visibility.anyVisible) return {};
+  // A host's progress display is closed on every way out once it was opened.
+  if (!visibility.anyVisible) {
+    progress.end();
+    return {};
+  }
 
   progress.update(2);
   VertexWeights weights;
-  if (!progress.isCanceled() && !solveHeat(mesh, areas, visibility, weights)) return {};
+  if (!progress.isCanceled() && !solveHeat(mesh, areas, visibility, weights)) {
+    progress.end();
+    return {};
+  }
 
   progress.update(3);
   if (progress.isCanceled()) {
@@ -108,15 +119,24 @@ VertexWeights HeatmapBind::bind(const MeshData& mesh,
     return {};
   }
   const std::size_t tips = sources.tipJoints.size();
+  std::vector<BoneWeight> byBone;
   for (std::vector<BoneWeight>& list : weights) {
-    std::map<std::uint32_t, double> byBone;
+    // A handful of sources per vertex: a short list, summed in the sources' order, beats a map.
+    byBone.clear();
     for (const BoneWeight& w : list) {
       const std::uint32_t bone = w.boneIndex < tips ? sources.tipJoints[w.boneIndex]
                                                     : sources.boneSegments[w.boneIndex - tips].first;
-      byBone[bone] += w.weight;
+      auto same = std::find_if(byBone.begin(), byBone.end(),
+                               [bone](const BoneWeight& b) { return b.boneIndex == bone; });
+      if (same == byBone.end()) {
+        byBone.push_back(BoneWeight{bone, w.weight});
+      } else {
+        same->weight += w.weight;
+      }
     }
-    list.clear();
-    for (const auto& [bone, weight] : byBone) list.push_back(BoneWeight{bone, weight});
+    std::sort(byBone.begin(), byBone.end(),
+              [](const BoneWeight& a, const BoneWeight& b) { return a.boneIndex < b.boneIndex; });
+    list.assign(byBone.begin(), byBone.end());
     normalizeWeights(list);
   }
 

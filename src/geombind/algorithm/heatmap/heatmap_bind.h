@@ -12,6 +12,10 @@ struct HeatmapOptions : IBindOptions {
   float falloff = 0.0f;             ///< 0: distance, 1: distance squared
 };
 
+/// Depth of the octree whose leaves decide line of sight: a triangle hides a bone from a vertex when the
+/// line through them crosses it and it shares a leaf of this depth with the segment between them.
+constexpr std::uint32_t kOcclusionDepth = 10;
+
 /// Area-weighted vertex normals, unit length. A vertex no triangle uses keeps the normal (0, 0, 0).
 void computeVertexNormals(MeshData& mesh);
 

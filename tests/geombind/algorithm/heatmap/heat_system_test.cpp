@@ -1,13 +1,17 @@
 #include "geombind/algorithm/heatmap/heat_system.h"
 
+#include <array>
 #include <cmath>
 #include <vector>
 
 #include <gtest/gtest.h>
 
+#include "collision/octree_sight.h"
 #include "geombind/algorithm/heatmap/heat_sources.h"
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
+#include "geombind/collision/occlusion_index.h"
 #include "geombind/preparation.h"
+#include "meshes/character.h"
 
 namespace {
 
@@ -36,7 +40,7 @@ TEST(HeatSystem, UnitSquareLaplacianRows) {
   EXPECT_EQ(system.vertexArea, (std::vector<double>{1.0, 0.5, 1.0, 0.5}));
 }
 
-// One vertex at the origin facing +z, bones below it as tip joints, and one far triangle so the octree
+// One vertex at the origin facing +z, bones below it as tip joints, and one far triangle so the index
 // has something to hold. Optionally a triangle between the vertex and the bones.
 struct Scene {
   explicit Scene(bool wall = false) {
@@ -50,11 +54,9 @@ struct Scene {
       }
       mesh.triangles.push_back({4, 5, 6});
     }
-    octree.reset(Collision::AABB(glm::dvec3(-2), glm::dvec3(7)));
-    for (const auto& t : mesh.triangles) {
-      octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
-    }
-    octree.build(0, 4);
+    std::vector<Collision::Triangle> list;
+    for (const auto& t : mesh.triangles) list.push_back(triangleOf(mesh, t));
+    triangles = Collision::OcclusionIndex(Collision::AABB(glm::dvec3(-2), glm::dvec3(7)), list, 4);
   }
   // Tip bones at the given positions; returns whether vertex 0 sees each.
   std::vector<bool> sees(const std::vector<glm::dvec3>& bones, double falloff) {
@@ -63,14 +65,15 @@ struct Scene {
       h.names.push_back("b" + std::to_string(b));
       h.transforms.push_back({1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, bones[b].x, bones[b].y, bones[b].z, 1});
     }
-    const SourceVisibility v =
-        computeSourceVisibility(mesh, h, octree, collectHeatSources(h), falloff, 0.01f);
+    const SourceVisibility v = computeSourceVisibility(
+        mesh, h, [this](const Collision::Segment& s) { return triangles.blocked(s); }, collectHeatSources(h),
+        falloff, 0.01f);
     std::vector<bool> seen;
     for (std::size_t b = 0; b < bones.size(); ++b) seen.push_back(v.isVisible(0, b));
     return seen;
   }
   MeshData mesh;
-  Collision::Octree octree;
+  Collision::OcclusionIndex triangles;
 };
 
 TEST(HeatVisibility, NearestWithinOneHundredthOfAPercentAreTested) {
@@ -141,6 +144,49 @@ TEST(HeatSystem, VertexOnABoneGetsABoundedHeatTerm) {
     EXPECT_TRUE(std::isfinite(list[0].weight));
     EXPECT_LE(list[0].weight, 1.0);
   }
+}
+
+// The index must hide exactly what the depth-10 octree hides on a whole character: the rest of the bind
+// reads nothing else of the triangles, so equal bits give equal weights.
+TEST(HeatVisibility, IndexAndOctreeGiveIdenticalBits) {
+  const tessik::meshes::Character source = tessik::meshes::character(0.05);
+  MeshImpl mesh;
+  for (const auto& p : source.mesh.positions) mesh.addVertex(p[0], p[1], p[2]);
+  for (const auto& t : source.mesh.triangles) mesh.addTriangle(t[0], t[1], t[2]);
+  TransformHierarchyImpl bones;
+  for (const auto& bone : source.bones) {
+    const auto& j = bone.position;
+    const std::array<double, 16> m = {1, 0, 0, j[0], 0, 1, 0, j[1], 0, 0, 1, j[2], 0, 0, 0, 1};
+    bones.addNode(bone.name.c_str(), m.data(), bone.parentName());
+  }
+  prepareForBinding(mesh.data, bones.data, PreparationMode::heatmap);
+  computeVertexNormals(mesh.data);
+  std::vector<Collision::Triangle> list;
+  for (const auto& t : mesh.data.triangles) list.push_back(triangleOf(mesh.data, t));
+  const Collision::OcclusionIndex index(mesh.data.boundingBox, list, kOcclusionDepth);
+  const Collision::Testing::OctreeSight octree(mesh.data.boundingBox, list, kOcclusionDepth);
+  const HeatSources sources = collectHeatSources(bones.data);
+  pushBonesOffVertices(mesh.data, bones.data, 0.01f);
+
+  auto withIndex = [&](const Collision::Segment& s) { return index.blocked(s); };
+  auto withOctree = [&](const Collision::Segment& s) { return octree.blocked(s); };
+  const SourceVisibility fast =
+      computeSourceVisibility(mesh.data, bones.data, withIndex, sources, 0.5, 0.01f);
+  const SourceVisibility reference =
+      computeSourceVisibility(mesh.data, bones.data, withOctree, sources, 0.5, 0.01f);
+  ASSERT_EQ(fast.visible, reference.visible);
+  std::size_t seen = 0, tested = 0;
+  for (std::size_t v = 0; v < mesh.data.vertices.size(); ++v) {
+    double nearest = fast.distance(v, 0);
+    for (std::size_t e = 0; e < sources.count(); ++e) nearest = std::min(nearest, fast.distance(v, e));
+    for (std::size_t e = 0; e < sources.count(); ++e) {
+      tested += fast.distance(v, e) <= nearest * 1.0001;
+      seen += fast.isVisible(v, e);
+    }
+  }
+  // Hidden nearest bones must occur, or equal bits would say nothing about the blocking test.
+  EXPECT_GT(seen, tested / 2);
+  EXPECT_LT(seen, tested);
 }
 
 }  // namespace

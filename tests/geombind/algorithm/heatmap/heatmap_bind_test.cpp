@@ -125,12 +125,12 @@ TEST(HeatmapBind, OneTinyTriangleEmptiesTheResult) {
   EXPECT_TRUE(bindHeat(arm, {{0.5, "root"}, {1.5, "tip"}}, 4).empty());
 }
 
-TEST(HeatmapBind, CancelledFromTheStartAnnouncesTwoStepsAndNoEnd) {
+TEST(HeatmapBind, CancelledFromTheStartClosesWhatItOpened) {
   const TriMesh arm = tessik::meshes::cylinderX(0.0f, 2.0f, 0.0f, 0.0f, 0.2f, 8, 8);
   Recording progress(true);
   EXPECT_TRUE(bindHeat(arm, {{0.5, "root"}, {1.5, "tip"}}, 4, &progress).empty());
-  EXPECT_EQ(progress.calls,
-            (std::vector<std::string>{"begin Computing Heatmap weights ... ", "update 0", "update 1"}));
+  EXPECT_EQ(progress.calls, (std::vector<std::string>{"begin Computing Heatmap weights ... ", "update 0",
+                                                      "update 1", "end"}));
 }
 
 }  // namespace
