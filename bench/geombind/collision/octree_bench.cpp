@@ -121,7 +121,7 @@ const Mesh& TheMesh() {
 std::unique_ptr<Octree> BuildTree(const Mesh& mesh, std::uint32_t depthLimit) {
   auto tree = std::make_unique<Octree>();
   tree->reset(mesh.box);
-  for (const Triangle& t : mesh.triangles) tree->insert(new TriangleElement(t));
+  for (const Triangle& t : mesh.triangles) tree->insert(std::make_unique<TriangleElement>(t));
   tree->build(0, depthLimit);
   return tree;
 }
@@ -138,16 +138,16 @@ class StatsVisitor : public IOctreeConstVisitor {
  public:
   void visit(const Octant& octant) override {
     stats.octants += 1;
-    stats.bytes += sizeof(Octant) + octant.children.capacity() * sizeof(octant.children[0]) +
-                   octant.elements.capacity() * sizeof(IOctreeElement*);
-    if (octant.children.empty()) {
-      const double n = static_cast<double>(octant.elements.size());
+    stats.bytes += sizeof(Octant) + octant.children().capacity() * sizeof(octant.children()[0]) +
+                   octant.elements().capacity() * sizeof(IOctreeElement*);
+    if (octant.children().empty()) {
+      const double n = static_cast<double>(octant.elements().size());
       if (n > 0) stats.leavesWithElements += 1;
       stats.listings += n;
       stats.maxLeafListings = std::max(stats.maxLeafListings, n);
       return;
     }
-    for (const auto& child : octant.children) child->accept(*this);
+    for (const auto& child : octant.children()) child->accept(*this);
   }
 
   TreeStats stats;
@@ -156,8 +156,8 @@ class StatsVisitor : public IOctreeConstVisitor {
 TreeStats Measure(const Octree& tree) {
   StatsVisitor visitor;
   tree.accept(visitor);
-  visitor.stats.bytes += static_cast<double>(tree.allElements.capacity() * sizeof(tree.allElements[0]) +
-                                             tree.allElements.size() * sizeof(TriangleElement));
+  visitor.stats.bytes += static_cast<double>(tree.allElements().capacity() * sizeof(tree.allElements()[0]) +
+                                             tree.allElements().size() * sizeof(TriangleElement));
   return visitor.stats;
 }
 
@@ -174,12 +174,12 @@ class PointVisitor : public IOctreeConstVisitor {
  public:
   void visit(const Octant& octant) override {
     if (!contains(octant.bounds, point)) return;
-    if (octant.children.empty()) {
-      listings += octant.elements.size();
-      if (found != nullptr) found->insert(found->end(), octant.elements.begin(), octant.elements.end());
+    if (octant.children().empty()) {
+      listings += octant.elements().size();
+      if (found != nullptr) found->insert(found->end(), octant.elements().begin(), octant.elements().end());
       return;
     }
-    for (const auto& child : octant.children) child->accept(*this);
+    for (const auto& child : octant.children()) child->accept(*this);
   }
 
   glm::dvec3 point{0.0};
@@ -194,11 +194,11 @@ class SegmentVisitor : public IOctreeConstVisitor {
  public:
   void visit(const Octant& octant) override {
     if (!intersects(octant.bounds, segment)) return;
-    if (octant.children.empty()) {
-      candidates.insert(candidates.end(), octant.elements.begin(), octant.elements.end());
+    if (octant.children().empty()) {
+      candidates.insert(candidates.end(), octant.elements().begin(), octant.elements().end());
       return;
     }
-    for (const auto& child : octant.children) child->accept(*this);
+    for (const auto& child : octant.children()) child->accept(*this);
   }
 
   // Returns how many distinct listed triangles the segment's line crosses.
@@ -211,8 +211,7 @@ class SegmentVisitor : public IOctreeConstVisitor {
     distinct += candidates.size();
     std::size_t hits = 0;
     for (const IOctreeElement* e : candidates) {
-      // Only triangles were inserted.
-      if (intersects(segment, static_cast<const TriangleElement*>(e)->primitive)) ++hits;
+      if (intersects(segment, *e->as<Triangle>())) ++hits;
     }
     return hits;
   }
@@ -281,7 +280,7 @@ std::string Verify(const Octree& tree, const Mesh& mesh) {
   for (int trial = 0; trial < 64; ++trial) {
     const std::size_t index = rng() % mesh.triangles.size();
     const Triangle& t = mesh.triangles[index];
-    const IOctreeElement* element = tree.allElements[index].get();
+    const IOctreeElement* element = tree.allElements()[index].get();
 
     PointVisitor pv;
     found.clear();
@@ -334,7 +333,7 @@ void BM_OctreeBuild(benchmark::State& state) {
     tree.reset();  // teardown is reported apart below
     state.ResumeTiming();
     tree = BuildTree(mesh, depth);
-    benchmark::DoNotOptimize(tree->children.data());
+    benchmark::DoNotOptimize(tree->children().data());
   }
   const std::string error = Verify(*tree, mesh);
   if (!error.empty()) {

@@ -45,16 +45,16 @@ Octant::Octant(const AABB& box, std::uint8_t depth) : bounds(box), depth(depth) 
 Octant::~Octant() = default;
 
 void Octant::deleteChildren() {
-  children.clear();
-  childBlock.reset();
+  children_.clear();
+  childBlock_.reset();
 }
 
 void Octant::split() {
-  childBlock.reset(new Octant[8]);
-  children.reserve(8);
+  childBlock_.reset(new Octant[8]);
+  children_.reserve(8);
   const glm::dvec3 c = (bounds.lower + bounds.upper) * 0.5;
   for (int i = 0; i < 8; ++i) {
-    Octant& child = childBlock[i];
+    Octant& child = childBlock_[i];
     for (int k = 0; k < 3; ++k) {
       // Neighbouring children share the exact centre value, so the closed tests agree on faces.
       const bool upperHalf = ((i >> k) & 1) != 0;
@@ -63,7 +63,7 @@ void Octant::split() {
     }
     child.bounds.inflateFlatAxes();
     child.depth = static_cast<std::uint8_t>(depth + 1);
-    children.push_back(&child);
+    children_.push_back(&child);
   }
 }
 
@@ -72,28 +72,29 @@ void Octant::subdivide(std::uint32_t minDepth, std::uint32_t depthLimit) {
   split();
   // Each element meets each child box once; the answers are kept so every child list is allocated at
   // its final size, in element order.
-  std::vector<std::uint8_t> touched(elements.size(), 0);
+  std::vector<std::uint8_t> touched(elements_.size(), 0);
   std::size_t counts[8] = {};
-  for (std::size_t e = 0; e < elements.size(); ++e) {
+  for (std::size_t e = 0; e < elements_.size(); ++e) {
     for (int i = 0; i < 8; ++i) {
-      if (elements[e]->intersects(children[i]->bounds)) {
+      if (elements_[e]->intersects(childBlock_[i].bounds)) {
         touched[e] = static_cast<std::uint8_t>(touched[e] | (1u << i));
         ++counts[i];
       }
     }
   }
   for (int i = 0; i < 8; ++i) {
-    std::vector<IOctreeElement*>& list = children[i]->elements;
+    std::vector<const IOctreeElement*>& list = childBlock_[i].elements_;
     list.reserve(counts[i]);
-    for (std::size_t e = 0; e < elements.size(); ++e) {
-      if ((touched[e] >> i) & 1u) list.push_back(elements[e]);
+    for (std::size_t e = 0; e < elements_.size(); ++e) {
+      if ((touched[e] >> i) & 1u) list.push_back(elements_[e]);
     }
   }
   std::vector<std::uint8_t>().swap(touched);
-  std::vector<IOctreeElement*>().swap(elements);
-  for (Octant* child : children) {
-    if (child->elements.empty() && child->depth >= minDepth) continue;
-    child->subdivide(minDepth, depthLimit);
+  std::vector<const IOctreeElement*>().swap(elements_);
+  for (int i = 0; i < 8; ++i) {
+    Octant& child = childBlock_[i];
+    if (child.elements_.empty() && child.depth >= minDepth) continue;
+    child.subdivide(minDepth, depthLimit);
   }
 }
 
@@ -107,12 +108,11 @@ void Octree::reset(const AABB& box) {
   bounds.inflateFlatAxes();
 }
 
-void Octree::insert(IOctreeElement* element) {
+void Octree::insert(std::unique_ptr<IOctreeElement> element) {
   if (element == nullptr) return;
-  // Owned before anything can throw, so a failed append cannot leak it.
-  std::unique_ptr<IOctreeElement> owned(element);
-  allElements.push_back(std::move(owned));
-  elements.push_back(element);
+  elements_.reserve(elements_.size() + 1);  // so that the push below cannot fail once it is owned
+  owned_.push_back(std::move(element));
+  elements_.push_back(owned_.back().get());
 }
 
 void Octree::build(std::uint32_t minDepth, std::uint32_t depthLimit) {
@@ -124,8 +124,8 @@ void Octree::build(std::uint32_t minDepth, std::uint32_t depthLimit) {
 
 void Octree::clear() {
   deleteChildren();
-  elements.clear();
-  allElements.clear();
+  elements_.clear();
+  owned_.clear();
 }
 
 }  // namespace TessikSDK::GeomBind::Collision

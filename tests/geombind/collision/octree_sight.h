@@ -16,7 +16,7 @@ class OctreeSight {
  public:
   OctreeSight(const AABB& bounds, const std::vector<Triangle>& triangles, std::uint32_t depth) {
     tree_.reset(bounds);
-    for (const Triangle& t : triangles) tree_.insert(new OctreeElement<Triangle>(t));
+    for (const Triangle& t : triangles) tree_.add(t);
     tree_.build(0, depth);
   }
 
@@ -31,10 +31,10 @@ class OctreeSight {
     explicit Walk(const Segment& s) : segment(s) {}
     void visit(const Octant& octant) override {
       if (hit || !intersects(octant.bounds, segment)) return;
-      for (const Octant* child : octant.children) child->accept(*this);
-      for (const IOctreeElement* element : octant.elements) {
+      for (const Octant* child : octant.children()) child->accept(*this);
+      for (const IOctreeElement* element : octant.elements()) {
         if (!tested.insert(element).second) continue;
-        if (intersects(segment, static_cast<const OctreeElement<Triangle>*>(element)->primitive)) {
+        if (intersects(segment, *element->as<Triangle>())) {
           hit = true;
           return;
         }

@@ -1,6 +1,7 @@
 #include "geombind/collision/octree.h"
 
 #include <map>
+#include <memory>
 #include <random>
 #include <set>
 #include <vector>
@@ -19,15 +20,15 @@ class StructureVisitor : public IOctreeConstVisitor {
   void visit(const Octant& octant) override {
     ++perDepth[octant.depth];
     path.push_back(&octant);
-    if (octant.children.empty()) {
+    if (octant.children().empty()) {
       leaves.push_back(&octant);
-      if (!octant.elements.empty()) ancestry[&octant] = path;
+      if (!octant.elements().empty()) ancestry[&octant] = path;
     } else {
-      EXPECT_EQ(octant.children.size(), 8u);
-      EXPECT_TRUE(octant.elements.empty()) << "an inner octant kept elements";
+      EXPECT_EQ(octant.children().size(), 8u);
+      EXPECT_TRUE(octant.elements().empty()) << "an inner octant kept elements";
       const glm::dvec3 c = (octant.bounds.lower + octant.bounds.upper) * 0.5;
       for (int i = 0; i < 8; ++i) {
-        const Octant& child = *octant.children[i];
+        const Octant& child = *octant.children()[i];
         EXPECT_EQ(child.depth, octant.depth + 1);
         for (int k = 0; k < 3; ++k) {
           const bool upper = ((i >> k) & 1) != 0;
@@ -72,12 +73,12 @@ class OctreeTest : public ::testing::Test {
 };
 
 TEST_F(OctreeTest, DepthZeroKeepsEverythingOnTheRoot) {
-  for (int i = 0; i < 5; ++i) tree.insert(new CountedPoint(glm::dvec3(i)));
+  for (int i = 0; i < 5; ++i) tree.insert(std::make_unique<CountedPoint>(glm::dvec3(i)));
   tree.insert(nullptr);
   tree.build(0, 0);
-  EXPECT_TRUE(tree.children.empty());
-  EXPECT_EQ(tree.elements.size(), 5u);
-  EXPECT_EQ(tree.allElements.size(), 5u);
+  EXPECT_TRUE(tree.children().empty());
+  EXPECT_EQ(tree.elements().size(), 5u);
+  EXPECT_EQ(tree.allElements().size(), 5u);
 }
 
 struct PointCase {
@@ -92,7 +93,7 @@ void PrintTo(const PointCase& c, std::ostream* os) { *os << c.name; }
 class OctreeSinglePoint : public OctreeTest, public ::testing::WithParamInterface<PointCase> {};
 
 TEST_P(OctreeSinglePoint, SplitsOnlyWhereThePointIs) {
-  tree.insert(new CountedPoint(GetParam().point));
+  tree.insert(std::make_unique<CountedPoint>(GetParam().point));
   tree.build(1, 3);
   const StructureVisitor v = walk(tree);
   EXPECT_EQ(v.perDepth, GetParam().octantsPerDepth);
@@ -126,28 +127,40 @@ TEST_F(OctreeTest, ElementsSitInExactlyTheLeavesTheyTouch) {
   auto near = [&](const glm::dvec3& p) { return p + glm::dvec3(step(rng), step(rng), step(rng)); };
   for (int i = 0; i < 60; ++i) {
     const glm::dvec3 p(coord(rng), coord(rng), coord(rng));
-    tree.insert(new OctreeElement<glm::dvec3>(p));
-    tree.insert(new OctreeElement<Segment>(Segment(p, near(p))));
-    tree.insert(new OctreeElement<Triangle>(Triangle(p, near(p), near(p))));
+    tree.add(p);
+    tree.add(Segment(p, near(p)));
+    tree.add(Triangle(p, near(p), near(p)));
   }
-  tree.insert(new OctreeElement<glm::dvec3>(glm::dvec3(2, 4, 6)));  // on cell corners at depth 3
+  tree.add(glm::dvec3(2, 4, 6));  // on cell corners at depth 3
   tree.build(0, 3);
   const StructureVisitor v = walk(tree);
   for (const Octant* leaf : v.leaves) {
-    std::set<const IOctreeElement*> listed(leaf->elements.begin(), leaf->elements.end());
-    EXPECT_EQ(listed.size(), leaf->elements.size()) << "element listed twice in one leaf";
+    std::set<const IOctreeElement*> listed(leaf->elements().begin(), leaf->elements().end());
+    EXPECT_EQ(listed.size(), leaf->elements().size()) << "element listed twice in one leaf";
     if (!listed.empty()) {
       EXPECT_EQ(leaf->depth, 3);
     }
-    for (const auto& element : tree.allElements) {
+    for (const auto& element : tree.allElements()) {
       EXPECT_EQ(listed.count(element.get()) == 1, element->intersects(leaf->bounds))
           << "leaf at depth " << int(leaf->depth);
     }
   }
   size_t cornerLeaves = 0;
   for (const Octant* leaf : v.leaves)
-    for (const IOctreeElement* e : leaf->elements) cornerLeaves += e == tree.allElements.back().get();
+    for (const IOctreeElement* e : leaf->elements()) cornerLeaves += e == tree.allElements().back().get();
   EXPECT_EQ(cornerLeaves, 8u);
+
+  // Inserted as point, segment, triangle in turn: each reads back as its own type only.
+  for (std::size_t i = 0; i + 1 < tree.allElements().size(); ++i) {
+    const IOctreeElement& e = *tree.allElements()[i];
+    EXPECT_EQ(e.as<glm::dvec3>() != nullptr, i % 3 == 0) << i;
+    EXPECT_EQ(e.as<Segment>() != nullptr, i % 3 == 1) << i;
+    ASSERT_EQ(e.as<Triangle>() != nullptr, i % 3 == 2) << i;
+    if (i % 3 == 0) {  // the same p began the segment and the triangle that follow it
+      EXPECT_EQ(*e.as<glm::dvec3>(), tree.allElements()[i + 1]->as<Segment>()->a);
+      EXPECT_EQ(*e.as<glm::dvec3>(), tree.allElements()[i + 2]->as<Triangle>()->a);
+    }
+  }
 }
 
 TEST(OctreeFlat, FlatMeshIsPaddedAndStillFound) {
@@ -159,42 +172,42 @@ TEST(OctreeFlat, FlatMeshIsPaddedAndStillFound) {
   bounds.extend(flat.c);
   tree.reset(bounds);
   EXPECT_DOUBLE_EQ(tree.bounds.upper.z - 2.0, static_cast<double>(0.5f));
-  tree.insert(new OctreeElement<Triangle>(flat));
+  tree.add(flat);
   tree.build(0, 4);
   const StructureVisitor v = walk(tree);
   EXPECT_GT(v.ancestry.size(), 8u);
 }
 
 TEST_F(OctreeTest, ClearResetAndDestructionDeleteEveryElement) {
-  for (int i = 0; i < 10; ++i) tree.insert(new CountedPoint(glm::dvec3(i % 8)));
+  for (int i = 0; i < 10; ++i) tree.insert(std::make_unique<CountedPoint>(glm::dvec3(i % 8)));
   tree.build(0, 2);
   tree.clear();
   EXPECT_EQ(CountedPoint::live, 0);
-  EXPECT_TRUE(tree.children.empty());
+  EXPECT_TRUE(tree.children().empty());
   EXPECT_EQ(tree.bounds.upper, glm::dvec3(8));
 
-  for (int i = 0; i < 10; ++i) tree.insert(new CountedPoint(glm::dvec3(1)));
+  for (int i = 0; i < 10; ++i) tree.insert(std::make_unique<CountedPoint>(glm::dvec3(1)));
   tree.reset(AABB({0, 0, 0}, {1, 1, 1}));
   EXPECT_EQ(CountedPoint::live, 0);
-  EXPECT_TRUE(tree.allElements.empty());
+  EXPECT_TRUE(tree.allElements().empty());
 
   {
     Octree scoped;
     scoped.reset(AABB({0, 0, 0}, {1, 1, 1}));
-    for (int i = 0; i < 10; ++i) scoped.insert(new CountedPoint(glm::dvec3(0.5)));
+    for (int i = 0; i < 10; ++i) scoped.insert(std::make_unique<CountedPoint>(glm::dvec3(0.5)));
     scoped.build(0, 3);
   }
   EXPECT_EQ(CountedPoint::live, 0);
 }
 
 TEST_F(OctreeTest, SecondBuildWithoutInsertsLeavesElementsOut) {
-  for (int i = 0; i < 4; ++i) tree.insert(new CountedPoint(glm::dvec3(1 + i)));
+  for (int i = 0; i < 4; ++i) tree.insert(std::make_unique<CountedPoint>(glm::dvec3(1 + i)));
   tree.build(0, 3);
   tree.build(0, 3);
   const StructureVisitor v = walk(tree);
   EXPECT_EQ(v.perDepth, (std::map<int, int>{{0, 1}, {1, 8}}));
   EXPECT_TRUE(v.ancestry.empty());
-  EXPECT_EQ(tree.allElements.size(), 4u);
+  EXPECT_EQ(tree.allElements().size(), 4u);
   EXPECT_EQ(CountedPoint::live, 4);
 }
 

@@ -31,7 +31,7 @@ void computeOctree(IProgress& progress,
   const int triangleCount = static_cast<int>(mesh.triangles.size());
   progress.begin("Computing Octree ... ", triangleCount, 0);
   for (const TriangleRecord& t : mesh.triangles) {
-    octree.insert(new Collision::OctreeElement<Collision::Triangle>(triangleOf(mesh, t)));
+    octree.add(triangleOf(mesh, t));
     progress.update(0);
     if (progress.isCanceled()) return;
   }
@@ -43,10 +43,9 @@ void computeOctree(IProgress& progress,
   for (const auto& [node, other] : elements) {
     const glm::dvec3 joint = jointPosition(hierarchy, node);
     if (other == NoNode) {
-      octree.insert(new Collision::OctreeElement<glm::dvec3>(joint));
+      octree.add(joint);
     } else {
-      octree.insert(new Collision::OctreeElement<Collision::Segment>(
-          Collision::Segment(joint, jointPosition(hierarchy, other))));
+      octree.add(Collision::Segment(joint, jointPosition(hierarchy, other)));
     }
     progress.update(0);
     if (progress.isCanceled()) return;

@@ -9,11 +9,11 @@ OctreeLeafTraverser::~OctreeLeafTraverser() = default;
 
 void OctreeLeafTraverser::visit(const Collision::Octant& octant) {
   if (!descendInto(octant)) return;
-  if (octant.children.empty()) {
+  if (octant.children().empty()) {
     visitLeaf(octant);
     return;
   }
-  for (const auto& child : octant.children) child->accept(*this);
+  for (const Collision::Octant* child : octant.children()) child->accept(*this);
 }
 
 VoxelExtractor::VoxelExtractor(const Collision::AABB& root,
@@ -70,7 +70,7 @@ void extractSparseVoxels(const Collision::Octree& octree,
                          VoxelMap& voxelMap) {
   voxels.clear();
   voxelMap.clear();
-  if (octree.allElements.empty() || octree.children.empty() || levels.empty()) return;
+  if (octree.allElements().empty() || octree.children().empty() || levels.empty()) return;
   VoxelExtractor extractor(octree.bounds, levels, voxels);
   octree.accept(extractor);
   for (const auto& voxel : voxels) voxelMap[voxel->octant] = voxel.get();

@@ -16,7 +16,7 @@ VertexWeights computeWeights(const Collision::Octree& octree,
                              std::uint32_t boneCount,
                              double exponent) {
   VertexWeights weights;
-  if (octree.allElements.empty() || octree.children.empty()) return weights;
+  if (octree.allElements().empty() || octree.children().empty()) return weights;
   weights.resize(mesh.vertices.size());
   const std::int64_t count = static_cast<std::int64_t>(mesh.vertices.size());
 #pragma omp parallel for schedule(static) num_threads(processorThreads())

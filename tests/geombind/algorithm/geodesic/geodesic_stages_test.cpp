@@ -25,7 +25,7 @@ using Collision::AABB;
 struct UniformVoxels {
   explicit UniformVoxels(std::uint32_t depth) {
     octree.reset(AABB(glm::dvec3(0), glm::dvec3(1)));
-    octree.insert(new Collision::OctreeElement<glm::dvec3>(glm::dvec3(0.5)));
+    octree.add(glm::dvec3(0.5));
     octree.build(depth, depth);
     for (std::uint32_t d = 0; d <= depth; ++d) {
       const std::uint32_t n = 1u << d;
@@ -62,7 +62,7 @@ TEST(GeodesicNeighbours, DifferentSizesSharingOnlyACornerAreNeighbours) {
   Collision::Octree octree;
   octree.reset(AABB(glm::dvec3(0), glm::dvec3(1)));
   // Splits only the low octant down to depth 2; the high octant stays one depth-1 leaf.
-  octree.insert(new Collision::OctreeElement<glm::dvec3>(glm::dvec3(0.3)));
+  octree.add(glm::dvec3(0.3));
   octree.build(1, 2);
   std::vector<VoxelGrid> levels = {{{1, 1, 1}, {Interior}},
                                    {{2, 2, 2}, std::vector<std::uint8_t>(8, Interior)},
