@@ -22,62 +22,191 @@ class LLTMatrixImpl final : public LLTMatrix {
   const CompressedFactor& factor() const override { return factor_; }
 
   CompressedFactor factor_;
+  std::vector<std::size_t> supernodes_;  // first column of each supernode, then n
 };
 
-// Both sweeps stream the columns of L once for all right-hand sides: a row of the block is `columns`
-// adjacent values, so each entry of L is one short vectorisable loop. Every value sees the same operations
-// in the same order as a single right-hand side would (a column sweep subtracts row i's terms in ascending
-// column order, as a row sweep does), so the results do not depend on the block's width.
+// Caps a supernode's width so that its columns' part of the block stays in cache for a wide block.
+constexpr std::size_t kMaxSupernode = 32;
+
+// Columns f .. l of L form a supernode when each column's rows are the next column plus that column's
+// rows: below the supernode's triangle they all share the rows of column l. The sweeps then read each of
+// those rows' values once per supernode instead of once per column. Column j's entry for the supernode's
+// q-th shared row sits at start[j] + (l - j) + q.
+std::vector<std::size_t> findSupernodes(const CompressedFactor& factor) {
+  const std::size_t n = factor.diagonal.size();
+  const std::vector<std::size_t>& start = factor.columnStart;
+  std::vector<std::size_t> first;
+  for (std::size_t j = 0; j < n; ++j) {
+    const bool continues = j > 0 && start[j] - start[j - 1] == start[j + 1] - start[j] + 1 &&
+                           factor.rowIndex[start[j - 1]] == static_cast<std::int32_t>(j) &&
+                           j - first.back() < kMaxSupernode;
+    if (!continues) first.push_back(j);
+  }
+  first.push_back(n);
+  return first;
+}
+
+// target[c] -= sum over k of sources[k][c] * weights[k], k ascending, for c < m. The columns go in
+// chunks whose running values stay in registers while k runs, so each source row is read once per chunk
+// and the target once in all; every value still sees its terms in the same order.
+template <std::size_t W>
+std::size_t subtractChunks(double* target,
+                           const double* const* sources,
+                           const double* weights,
+                           std::size_t count,
+                           std::size_t c,
+                           std::size_t m) {
+  for (; c + W <= m; c += W) {
+    double acc[W];
+    for (std::size_t t = 0; t < W; ++t) acc[t] = target[c + t];
+    for (std::size_t k = 0; k < count; ++k) {
+      const double* source = sources[k] + c;
+      const double w = weights[k];
+      for (std::size_t t = 0; t < W; ++t) acc[t] -= source[t] * w;
+    }
+    for (std::size_t t = 0; t < W; ++t) target[c + t] = acc[t];
+  }
+  return c;
+}
+
+void subtractProducts(
+    double* target, const double* const* sources, const double* weights, std::size_t count, std::size_t m) {
+  std::size_t c = subtractChunks<8>(target, sources, weights, count, 0, m);
+  c = subtractChunks<4>(target, sources, weights, count, c, m);
+  c = subtractChunks<2>(target, sources, weights, count, c, m);
+  subtractChunks<1>(target, sources, weights, count, c, m);
+}
+
+// The supernode's columns (forward) or shared rows (backward) as row pointers into the block, and one
+// shared row's values across the columns: scratch reused from supernode to supernode.
+struct SweepScratch {
+  std::vector<const double*> rows;
+  std::vector<double> weights;
+};
+
+void forwardSweep(const CompressedFactor& factor,
+                  const std::vector<std::size_t>& supernodes,
+                  double* y,
+                  std::size_t m,
+                  std::size_t firstRow,
+                  SweepScratch& scratch) {
+  const std::size_t* start = factor.columnStart.data();
+  const std::int32_t* rows = factor.rowIndex.data();
+  const double* values = factor.value.data();
+  const double* diagonal = factor.diagonal.data();
+  auto s = static_cast<std::size_t>(std::upper_bound(supernodes.begin(), supernodes.end(), firstRow) -
+                                    supernodes.begin()) -
+           1;
+  for (; s + 1 < supernodes.size(); ++s) {
+    const std::size_t f = supernodes[s], l = supernodes[s + 1] - 1;
+    bool nonzero = false;
+    for (std::size_t c = f * m; c < (l + 1) * m; ++c) nonzero |= y[c] != 0.0;
+    // A zero stretch stays zero and changes no later row; the heat sources' right-hand sides are mostly
+    // zero.
+    if (!nonzero) continue;
+    scratch.rows.clear();
+    for (std::size_t j = f; j <= l; ++j) {
+      double* yj = y + j * m;
+      for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
+      for (std::size_t i = j + 1; i <= l; ++i) {
+        const double v = values[start[j] + (i - j - 1)];
+        double* yi = y + i * m;
+        for (std::size_t c = 0; c < m; ++c) yi[c] -= yj[c] * v;
+      }
+      scratch.rows.push_back(yj);
+    }
+    // Row i's terms still arrive in ascending column order, as a plain column sweep would apply them.
+    const std::size_t width = l + 1 - f;
+    const std::size_t shared = start[l + 1] - start[l];
+    scratch.weights.resize(width);
+    for (std::size_t q = 0; q < shared; ++q) {
+      for (std::size_t j = f; j <= l; ++j) scratch.weights[j - f] = values[start[j] + (l - j) + q];
+      subtractProducts(y + static_cast<std::size_t>(rows[start[l] + q]) * m, scratch.rows.data(),
+                       scratch.weights.data(), width, m);
+    }
+  }
+}
+
+void backwardSweep(const CompressedFactor& factor,
+                   const std::vector<std::size_t>& supernodes,
+                   double* y,
+                   std::size_t m,
+                   SweepScratch& scratch) {
+  const std::size_t* start = factor.columnStart.data();
+  const std::int32_t* rows = factor.rowIndex.data();
+  const double* values = factor.value.data();
+  const double* diagonal = factor.diagonal.data();
+  for (std::size_t s = supernodes.size() - 1; s-- > 0;) {
+    const std::size_t f = supernodes[s], l = supernodes[s + 1] - 1;
+    // The shared rows are final already, so their terms go first; each column of L is contiguous there.
+    const std::size_t shared = start[l + 1] - start[l];
+    scratch.rows.resize(shared);
+    for (std::size_t q = 0; q < shared; ++q)
+      scratch.rows[q] = y + static_cast<std::size_t>(rows[start[l] + q]) * m;
+    for (std::size_t j = f; j <= l; ++j) {
+      subtractProducts(y + j * m, scratch.rows.data(), values + start[j] + (l - j), shared, m);
+    }
+    for (std::size_t j = l + 1; j-- > f;) {
+      double* yj = y + j * m;
+      for (std::size_t i = j + 1; i <= l; ++i) {
+        const double v = values[start[j] + (i - j - 1)];
+        const double* yi = y + i * m;
+        for (std::size_t c = 0; c < m; ++c) yj[c] -= yi[c] * v;
+      }
+      for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
+    }
+  }
+}
+
+// Both sweeps stream L once for all right-hand sides: a row of the block is `columns` adjacent values, so
+// each entry of L is one short vectorisable loop. Every value sees the same operations in the same order
+// whatever the block's width, so a column's result does not depend on its neighbours.
 bool LLTMatrixImpl::solve(std::vector<double>& block, std::size_t columns) const {
   const std::size_t n = factor_.diagonal.size();
   if (columns == 0 || block.size() / columns != n || block.size() % columns != 0) return false;
   const std::size_t m = columns;
   const std::vector<std::int32_t>& permutation = factor_.permutation;
-  const std::vector<std::size_t>& start = factor_.columnStart;
-  const std::int32_t* rows = factor_.rowIndex.data();
-  const double* values = factor_.value.data();
-  const double* diagonal = factor_.diagonal.data();
 
-  std::vector<double> y(n * m);
   std::size_t first = n;  // the first permuted row holding a nonzero: all rows above it solve to zero
   for (std::size_t i = 0; i < n; ++i) {
-    const auto target = static_cast<std::size_t>(permutation[i]);
-    const double* from = block.data() + i * m;
-    double* to = y.data() + target * m;
-    bool nonzero = false;
-    for (std::size_t c = 0; c < m; ++c) {
-      to[c] = from[c];
-      nonzero |= from[c] != 0.0;
+    const double* row = block.data() + i * m;
+    if (std::any_of(row, row + m, [](double v) { return v != 0.0; })) {
+      first = std::min(first, static_cast<std::size_t>(permutation[i]));
     }
-    if (nonzero) first = std::min(first, target);
+  }
+  if (first == n) return true;  // zero in, zero out
+
+  // The block is permuted in place, row by row along the permutation's cycles: a second block-sized
+  // buffer would cost more to allocate and fault in than the sweeps over it.
+  std::vector<char> moved(n, 0);
+  std::vector<double> carry(m);
+  double* y = block.data();
+  for (std::size_t i = 0; i < n; ++i) {  // row i goes to permutation[i]
+    if (moved[i]) continue;
+    std::copy(y + i * m, y + (i + 1) * m, carry.begin());
+    for (auto k = static_cast<std::size_t>(permutation[i]);; k = static_cast<std::size_t>(permutation[k])) {
+      moved[k] = 1;
+      if (k == i) break;
+      std::swap_ranges(carry.begin(), carry.end(), y + k * m);
+    }
+    std::copy(carry.begin(), carry.end(), y + i * m);
   }
 
-  for (std::size_t j = first; j < n; ++j) {
-    double* yj = y.data() + j * m;
-    bool nonzero = false;
-    for (std::size_t c = 0; c < m; ++c) nonzero |= yj[c] != 0.0;
-    // A zero row stays zero and changes no later row; the heat sources' right-hand sides are mostly zero.
-    if (!nonzero) continue;
-    for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
-    for (std::size_t p = start[j]; p < start[j + 1]; ++p) {
-      const double l = values[p];
-      double* yi = y.data() + static_cast<std::size_t>(rows[p]) * m;
-      for (std::size_t c = 0; c < m; ++c) yi[c] -= yj[c] * l;
-    }
-  }
-  for (std::size_t j = n; j-- > 0;) {
-    double* yj = y.data() + j * m;
-    for (std::size_t p = start[j]; p < start[j + 1]; ++p) {
-      const double l = values[p];
-      const double* yi = y.data() + static_cast<std::size_t>(rows[p]) * m;
-      for (std::size_t c = 0; c < m; ++c) yj[c] -= yi[c] * l;
-    }
-    for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
-  }
+  SweepScratch scratch;
+  forwardSweep(factor_, supernodes_, y, m, first, scratch);
+  backwardSweep(factor_, supernodes_, y, m, scratch);
 
-  for (std::size_t i = 0; i < n; ++i) {
-    const double* from = y.data() + static_cast<std::size_t>(permutation[i]) * m;
-    std::copy(from, from + m, block.data() + i * m);
+  for (std::size_t i = 0; i < n; ++i) {  // row i comes back from permutation[i]
+    if (!moved[i]) continue;
+    std::copy(y + i * m, y + (i + 1) * m, carry.begin());
+    std::size_t k = i;
+    for (auto next = static_cast<std::size_t>(permutation[k]); next != i;
+         k = next, next = static_cast<std::size_t>(permutation[k])) {
+      std::copy(y + next * m, y + (next + 1) * m, y + k * m);
+      moved[k] = 0;
+    }
+    std::copy(carry.begin(), carry.end(), y + k * m);
+    moved[k] = 0;
   }
   return true;
 }
@@ -421,6 +550,7 @@ std::unique_ptr<LLTMatrix> factorLLT(const SparseSymmetricMatrix& matrix) {
     if (!(d > 0.0)) return nullptr;
     factor.diagonal[r] = std::sqrt(d);
   }
+  result->supernodes_ = findSupernodes(factor);
   return result;
 }
 
