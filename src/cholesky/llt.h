@@ -37,8 +37,9 @@ class LLTMatrix {
   virtual std::int32_t size() const = 0;
   /// Solves M X = B for `columns` right-hand sides at once. `block` is B row-major on entry (size() rows of
   /// `columns` values, input row order, the right-hand sides of one row adjacent) and X on return. Each
-  /// column's result is bit-identical to solving it alone. False, block unchanged, when `columns` is 0 or
-  /// the block's size is not size() * columns.
+  /// column's result equals solving it alone, bit for bit but for the sign of a zero: it sees the same
+  /// operations in the same order. False, block unchanged, when `columns` is 0 or the block's size is
+  /// not size() * columns. Threads: none of its own; the caller may run several at once.
   virtual bool solve(std::vector<double>& block, std::size_t columns) const = 0;
   /// The factor itself, for callers that need L rather than solutions.
   virtual const CompressedFactor& factor() const = 0;
@@ -51,10 +52,9 @@ class LLTMatrix {
 std::vector<std::int32_t> minimumDegreeOrder(const SparseSymmetricMatrix& matrix);
 
 /// Up-looking factorisation of the matrix permuted by minimumDegreeOrder, L built straight into compressed
-/// columns. Null when the matrix is not
-/// positive definite (a pivot at or below 0, or NaN) or a row lacks its diagonal entry (the row is empty,
-/// or its last entry is not on the diagonal); null too when a row's columns are not strictly ascending
-/// from 0 or above, since such a row has no single entry to read per column.
+/// columns. Null when the matrix is not positive definite (a pivot at or below 0, or NaN) or a row lacks its
+/// diagonal entry (the row is empty, or its last entry is not on the diagonal); null too when a row's columns
+/// are not strictly ascending from 0 or above, since such a row has no single entry to read per column.
 std::unique_ptr<LLTMatrix> factorLLT(const SparseSymmetricMatrix& matrix);
 
 }  // namespace TessikSDK::Cholesky
