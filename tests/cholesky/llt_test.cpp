@@ -271,8 +271,8 @@ TEST(LLTRandomSystems, FactorMatchesDenseReference) {
   }
 }
 
-// Each column of a block is zero above its own permuted row, the shape of the heat
-// sources' right-hand sides. Every column must match its single solve bit for bit and solve the system.
+// Each column of a block is zero above its own permuted row, the shape of the heat sources' right-hand
+// sides. Every column must match its single solve bit for bit and solve the system.
 TEST(LLTRandomSystems, BlockSolveMatchesSingleSolvesWithLeadingZeros) {
   std::mt19937 rng(5);
   for (const RandomCase& c : kRandomCases) {
