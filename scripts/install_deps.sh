@@ -7,7 +7,7 @@ packages=(
   cmake g++ make clang-format
   libtbb-dev libglm-dev libglew-dev
   libegl-dev libgl-dev libegl-mesa0 libgl1-mesa-dri
-  libgtest-dev libbenchmark-dev libeigen3-dev
+  libgtest-dev libbenchmark-dev libeigen3-dev libsuitesparse-dev
   python3-dev pybind11-dev python3-numpy python3-pytest
   libassimp-dev assimp-testmodels nlohmann-json3-dev libcli11-dev libtinygltf-dev libstb-dev
 )

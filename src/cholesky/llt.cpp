@@ -16,31 +16,198 @@ namespace {
 
 class LLTMatrixImpl final : public LLTMatrix {
  public:
-  bool solve(std::vector<double>& b) const override;
-  std::int32_t size() const override { return static_cast<std::int32_t>(factorRows.size()); }
+  bool solve(std::vector<double>& b) const override { return solve(b, 1); }
+  bool solve(std::vector<double>& block, std::size_t columns) const override;
+  std::int32_t size() const override { return static_cast<std::int32_t>(factor_.diagonal.size()); }
+  const CompressedFactor& factor() const override { return factor_; }
 
-  std::vector<SparseRow> factorRows;     // strictly-lower entries of row i, ascending column
-  std::vector<SparseRow> factorColumns;  // the same entries by column, ascending row
-  std::vector<double> diagonal;
-  std::vector<std::int32_t> permutation;  // input row -> permuted row
+  CompressedFactor factor_;
+  std::vector<std::size_t> supernodes_;  // first column of each supernode, then n
 };
 
-bool LLTMatrixImpl::solve(std::vector<double>& b) const {
-  const std::size_t n = factorRows.size();
-  if (b.size() != n) return false;
-  std::vector<double> y(n);
-  for (std::size_t i = 0; i < n; ++i) y[static_cast<std::size_t>(permutation[i])] = b[i];
+// Caps a supernode's width so that its columns' part of the block stays in cache for a wide block.
+constexpr std::size_t kMaxSupernode = 32;
+
+// Columns f .. l of L form a supernode when each column's rows are the next column plus that column's
+// rows: below the supernode's triangle they all share the rows of column l. The sweeps then read each of
+// those rows' values once per supernode instead of once per column. Column j's entry for the supernode's
+// q-th shared row sits at start[j] + (l - j) + q.
+std::vector<std::size_t> findSupernodes(const CompressedFactor& factor) {
+  const std::size_t n = factor.diagonal.size();
+  const std::vector<std::size_t>& start = factor.columnStart;
+  std::vector<std::size_t> first;
+  for (std::size_t j = 0; j < n; ++j) {
+    const bool continues = j > 0 && start[j] - start[j - 1] == start[j + 1] - start[j] + 1 &&
+                           factor.rowIndex[start[j - 1]] == static_cast<std::int32_t>(j) &&
+                           j - first.back() < kMaxSupernode;
+    if (!continues) first.push_back(j);
+  }
+  first.push_back(n);
+  return first;
+}
+
+// target[c] -= sum over k of sources[k][c] * weights[k], k ascending, for c < m. The columns go in
+// chunks whose running values stay in registers while k runs, so each source row is read once per chunk
+// and the target once in all; every value still sees its terms in the same order.
+template <std::size_t W>
+std::size_t subtractChunks(double* target,
+                           const double* const* sources,
+                           const double* weights,
+                           std::size_t count,
+                           std::size_t c,
+                           std::size_t m) {
+  for (; c + W <= m; c += W) {
+    double acc[W];
+    for (std::size_t t = 0; t < W; ++t) acc[t] = target[c + t];
+    for (std::size_t k = 0; k < count; ++k) {
+      const double* source = sources[k] + c;
+      const double w = weights[k];
+      for (std::size_t t = 0; t < W; ++t) acc[t] -= source[t] * w;
+    }
+    for (std::size_t t = 0; t < W; ++t) target[c + t] = acc[t];
+  }
+  return c;
+}
+
+void subtractProducts(
+    double* target, const double* const* sources, const double* weights, std::size_t count, std::size_t m) {
+  std::size_t c = subtractChunks<8>(target, sources, weights, count, 0, m);
+  c = subtractChunks<4>(target, sources, weights, count, c, m);
+  c = subtractChunks<2>(target, sources, weights, count, c, m);
+  subtractChunks<1>(target, sources, weights, count, c, m);
+}
+
+// The supernode's columns (forward) or shared rows (backward) as row pointers into the block, and one
+// shared row's values across the columns: scratch reused from supernode to supernode.
+struct SweepScratch {
+  std::vector<const double*> rows;
+  std::vector<double> weights;
+};
+
+void forwardSweep(const CompressedFactor& factor,
+                  const std::vector<std::size_t>& supernodes,
+                  double* y,
+                  std::size_t m,
+                  std::size_t firstRow,
+                  SweepScratch& scratch) {
+  const std::size_t* start = factor.columnStart.data();
+  const std::int32_t* rows = factor.rowIndex.data();
+  const double* values = factor.value.data();
+  const double* diagonal = factor.diagonal.data();
+  auto s = static_cast<std::size_t>(std::upper_bound(supernodes.begin(), supernodes.end(), firstRow) -
+                                    supernodes.begin()) -
+           1;
+  for (; s + 1 < supernodes.size(); ++s) {
+    const std::size_t f = supernodes[s], l = supernodes[s + 1] - 1;
+    bool nonzero = false;
+    for (std::size_t c = f * m; c < (l + 1) * m; ++c) nonzero |= y[c] != 0.0;
+    // A zero stretch stays zero and changes no later row; the heat sources' right-hand sides are mostly
+    // zero.
+    if (!nonzero) continue;
+    scratch.rows.clear();
+    for (std::size_t j = f; j <= l; ++j) {
+      double* yj = y + j * m;
+      for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
+      for (std::size_t i = j + 1; i <= l; ++i) {
+        const double v = values[start[j] + (i - j - 1)];
+        double* yi = y + i * m;
+        for (std::size_t c = 0; c < m; ++c) yi[c] -= yj[c] * v;
+      }
+      scratch.rows.push_back(yj);
+    }
+    // Row i's terms still arrive in ascending column order, as a plain column sweep would apply them.
+    const std::size_t width = l + 1 - f;
+    const std::size_t shared = start[l + 1] - start[l];
+    scratch.weights.resize(width);
+    for (std::size_t q = 0; q < shared; ++q) {
+      for (std::size_t j = f; j <= l; ++j) scratch.weights[j - f] = values[start[j] + (l - j) + q];
+      subtractProducts(y + static_cast<std::size_t>(rows[start[l] + q]) * m, scratch.rows.data(),
+                       scratch.weights.data(), width, m);
+    }
+  }
+}
+
+void backwardSweep(const CompressedFactor& factor,
+                   const std::vector<std::size_t>& supernodes,
+                   double* y,
+                   std::size_t m,
+                   SweepScratch& scratch) {
+  const std::size_t* start = factor.columnStart.data();
+  const std::int32_t* rows = factor.rowIndex.data();
+  const double* values = factor.value.data();
+  const double* diagonal = factor.diagonal.data();
+  for (std::size_t s = supernodes.size() - 1; s-- > 0;) {
+    const std::size_t f = supernodes[s], l = supernodes[s + 1] - 1;
+    // The shared rows are final already, so their terms go first; each column of L is contiguous there.
+    const std::size_t shared = start[l + 1] - start[l];
+    scratch.rows.resize(shared);
+    for (std::size_t q = 0; q < shared; ++q)
+      scratch.rows[q] = y + static_cast<std::size_t>(rows[start[l] + q]) * m;
+    for (std::size_t j = f; j <= l; ++j) {
+      subtractProducts(y + j * m, scratch.rows.data(), values + start[j] + (l - j), shared, m);
+    }
+    for (std::size_t j = l + 1; j-- > f;) {
+      double* yj = y + j * m;
+      for (std::size_t i = j + 1; i <= l; ++i) {
+        const double v = values[start[j] + (i - j - 1)];
+        const double* yi = y + i * m;
+        for (std::size_t c = 0; c < m; ++c) yj[c] -= yi[c] * v;
+      }
+      for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
+    }
+  }
+}
+
+// Both sweeps stream L once for all right-hand sides: a row of the block is `columns` adjacent values, so
+// each entry of L is one short vectorisable loop. Every value sees the same operations in the same order
+// whatever the block's width, so a column's result does not depend on its neighbours.
+bool LLTMatrixImpl::solve(std::vector<double>& block, std::size_t columns) const {
+  const std::size_t n = factor_.diagonal.size();
+  if (columns == 0 || block.size() / columns != n || block.size() % columns != 0) return false;
+  const std::size_t m = columns;
+  const std::vector<std::int32_t>& permutation = factor_.permutation;
+
+  std::size_t first = n;  // the first permuted row holding a nonzero: all rows above it solve to zero
   for (std::size_t i = 0; i < n; ++i) {
-    double value = y[i];
-    for (const auto& [k, l] : factorRows[i]) value -= y[static_cast<std::size_t>(k)] * l;
-    y[i] = value / diagonal[i];
+    const double* row = block.data() + i * m;
+    if (std::any_of(row, row + m, [](double v) { return v != 0.0; })) {
+      first = std::min(first, static_cast<std::size_t>(permutation[i]));
+    }
   }
-  for (std::size_t i = n; i-- > 0;) {
-    double value = y[i];
-    for (const auto& [j, l] : factorColumns[i]) value -= y[static_cast<std::size_t>(j)] * l;
-    y[i] = value / diagonal[i];
+  if (first == n) return true;  // zero in, zero out
+
+  // The block is permuted in place, row by row along the permutation's cycles: a second block-sized
+  // buffer would cost more to allocate and fault in than the sweeps over it.
+  std::vector<char> moved(n, 0);
+  std::vector<double> carry(m);
+  double* y = block.data();
+  for (std::size_t i = 0; i < n; ++i) {  // row i goes to permutation[i]
+    if (moved[i]) continue;
+    std::copy(y + i * m, y + (i + 1) * m, carry.begin());
+    for (auto k = static_cast<std::size_t>(permutation[i]);; k = static_cast<std::size_t>(permutation[k])) {
+      moved[k] = 1;
+      if (k == i) break;
+      std::swap_ranges(carry.begin(), carry.end(), y + k * m);
+    }
+    std::copy(carry.begin(), carry.end(), y + i * m);
   }
-  for (std::size_t i = 0; i < n; ++i) b[i] = y[static_cast<std::size_t>(permutation[i])];
+
+  SweepScratch scratch;
+  forwardSweep(factor_, supernodes_, y, m, first, scratch);
+  backwardSweep(factor_, supernodes_, y, m, scratch);
+
+  for (std::size_t i = 0; i < n; ++i) {  // row i comes back from permutation[i]
+    if (!moved[i]) continue;
+    std::copy(y + i * m, y + (i + 1) * m, carry.begin());
+    std::size_t k = i;
+    for (auto next = static_cast<std::size_t>(permutation[k]); next != i;
+         k = next, next = static_cast<std::size_t>(permutation[k])) {
+      std::copy(y + next * m, y + (next + 1) * m, y + k * m);
+      moved[k] = 0;
+    }
+    std::copy(carry.begin(), carry.end(), y + k * m);
+    moved[k] = 0;
+  }
   return true;
 }
 
@@ -285,111 +452,106 @@ std::vector<std::int32_t> minimumDegreeOrder(const SparseSymmetricMatrix& matrix
 std::unique_ptr<LLTMatrix> factorLLT(const SparseSymmetricMatrix& matrix) {
   if (!isWellFormed(matrix)) return nullptr;
   const std::size_t n = matrix.size();
-  auto factor = std::make_unique<LLTMatrixImpl>();
-  factor->factorRows.resize(n);
-  factor->diagonal.assign(n, 0.0);
-  factor->permutation = minimumDegreeOrder(matrix);
-  const std::vector<std::int32_t>& permutation = factor->permutation;
+  auto result = std::make_unique<LLTMatrixImpl>();
+  CompressedFactor& factor = result->factor_;
+  factor.permutation = minimumDegreeOrder(matrix);
+  const std::vector<std::int32_t>& permutation = factor.permutation;
 
-  // The permuted matrix in compressed rows: rowStart[i] .. rowStart[i + 1] holds row i.
+  // The permuted matrix's strictly-lower rows, compressed: rowStart[i] .. rowStart[i + 1] holds row i, in
+  // no particular order since the walks below only scatter them. Diagonals go apart.
   std::vector<std::size_t> rowStart(n + 1, 0);
   for (std::size_t r = 0; r < n; ++r) {
-    for (const auto& entry : matrix[r]) {
+    for (std::size_t e = 0; e + 1 < matrix[r].size(); ++e) {
       const std::int32_t a = permutation[r];
-      const std::int32_t b = permutation[static_cast<std::size_t>(entry.first)];
+      const std::int32_t b = permutation[static_cast<std::size_t>(matrix[r][e].first)];
       ++rowStart[static_cast<std::size_t>(std::max(a, b)) + 1];
     }
   }
   for (std::size_t i = 0; i < n; ++i) rowStart[i + 1] += rowStart[i];
-  std::vector<std::pair<std::int32_t, double>> permuted(rowStart[n]);
-  std::vector<std::size_t> fill(rowStart.begin(), rowStart.end() - 1);
-  for (std::size_t r = 0; r < n; ++r) {
-    for (const auto& [c, value] : matrix[r]) {
-      const std::int32_t a = permutation[r];
-      const std::int32_t b = permutation[static_cast<std::size_t>(c)];
-      permuted[fill[static_cast<std::size_t>(std::max(a, b))]++] = {std::min(a, b), value};
+  std::vector<std::int32_t> lowerColumn(rowStart[n]);
+  std::vector<double> lowerValue(rowStart[n]);
+  std::vector<double> pivot(n);
+  {
+    std::vector<std::size_t> fill(rowStart.begin(), rowStart.end() - 1);
+    for (std::size_t r = 0; r < n; ++r) {
+      const auto a = permutation[r];
+      for (std::size_t e = 0; e + 1 < matrix[r].size(); ++e) {
+        const auto b = permutation[static_cast<std::size_t>(matrix[r][e].first)];
+        const std::size_t slot = fill[static_cast<std::size_t>(std::max(a, b))]++;
+        lowerColumn[slot] = std::min(a, b);
+        lowerValue[slot] = matrix[r][e].second;
+      }
+      pivot[static_cast<std::size_t>(a)] = matrix[r].back().second;
     }
   }
-  auto byColumn = [](const auto& x, const auto& y) { return x.first < y.first; };
-  for (std::size_t i = 0; i < n; ++i) {
-    std::sort(permuted.begin() + static_cast<std::ptrdiff_t>(rowStart[i]),
-              permuted.begin() + static_cast<std::ptrdiff_t>(rowStart[i + 1]), byColumn);
-  }
 
-  // A row's pattern is the closure over the column lists of the columns it names, and that closure need
-  // only follow each listed column's first entry, its parent: every other row q of the column holds the
-  // parent too, because row q's own closure took in the whole column, parent included, when q was
-  // factored. So the walks below find the same set while touching only its members. A counting pass over
-  // them sizes every row and column list up front: none reallocates, and rows, then columns, are
-  // allocated in order, which keeps each sweep of `solve` reading nearby memory.
+  // Symbolic pass. Row r's pattern is the union of the elimination-tree paths from its entries' columns
+  // up towards r; each path stops at the first node this row already reached, so the walk costs one step
+  // per entry of L. A column's first entry below the diagonal names its parent, which is how the tree grows
+  // as rows are added. Counting each column here lets L be allocated once, in place.
   std::vector<std::int32_t> parent(n, -1);
-  std::vector<std::size_t> visited(n, n);
-  std::vector<std::size_t> rowCount(n, 0), columnCount(n, 0);
+  std::vector<std::size_t> mark(n, n);
+  std::vector<std::size_t>& columnStart = factor.columnStart;
+  columnStart.assign(n + 1, 0);
   for (std::size_t r = 0; r < n; ++r) {
-    visited[r] = r;
-    for (std::size_t e = rowStart[r]; e + 1 < rowStart[r + 1]; ++e) {
-      for (auto k = static_cast<std::size_t>(permuted[e].first); visited[k] != r;
+    mark[r] = r;
+    for (std::size_t e = rowStart[r]; e < rowStart[r + 1]; ++e) {
+      for (auto k = static_cast<std::size_t>(lowerColumn[e]); mark[k] != r;
            k = static_cast<std::size_t>(parent[k])) {
-        visited[k] = r;
-        ++rowCount[r];
-        ++columnCount[k];
+        mark[k] = r;
+        ++columnStart[k + 1];
         if (parent[k] < 0) parent[k] = static_cast<std::int32_t>(r);
       }
     }
   }
-  factor->factorColumns.resize(n);
-  for (std::size_t r = 0; r < n; ++r) factor->factorRows[r].reserve(rowCount[r]);
-  for (std::size_t k = 0; k < n; ++k) factor->factorColumns[k].reserve(columnCount[k]);
+  for (std::size_t k = 0; k < n; ++k) columnStart[k + 1] += columnStart[k];
+  factor.rowIndex.resize(columnStart[n]);
+  factor.value.resize(columnStart[n]);
+  factor.diagonal.assign(n, 0.0);
 
-  // factorColumns[k] is column k of the factor so far. Row r's own entries are accumulated in `work` and
-  // appended only once final, so every pair in a column list during row r belongs to an earlier row.
-  std::vector<double> invD(n, 0.0);
+  // Numeric pass: row r of L solves L[0..r) x = (row r of the permuted matrix), a sparse triangular solve
+  // over the pattern. The pattern is visited child before parent (each path is pushed reversed onto the
+  // back of `order`, then read from the back), which is all the solve needs: a column's value is final once
+  // every descendant in the pattern has been applied, and no sort is needed. Columns fill in row order, so
+  // their entries come out ascending.
+  std::vector<std::size_t> next(columnStart.begin(), columnStart.end() - 1);
   std::vector<double> work(n, 0.0);
-  std::vector<std::int32_t> pattern;
+  std::vector<std::int32_t> order(n), path(n);
+  std::int32_t* rowIndex = factor.rowIndex.data();
+  double* value = factor.value.data();
+  const double* diagonal = factor.diagonal.data();
   for (std::size_t r = 0; r < n; ++r) {
-    const std::size_t begin = rowStart[r];
-    const std::size_t last = rowStart[r + 1] - 1;  // the diagonal, largest column after the sort
-
-    // `visited` still holds the counting pass's marks, all below n; n + r marks this row afresh.
-    pattern.clear();
-    visited[r] = n + r;
-    for (std::size_t e = begin; e < last; ++e) {
-      for (auto k = static_cast<std::size_t>(permuted[e].first); visited[k] != n + r;
-           k = static_cast<std::size_t>(parent[k])) {
-        visited[k] = n + r;
-        pattern.push_back(static_cast<std::int32_t>(k));
+    std::size_t top = n;  // order[top .. n) is the pattern, children first
+    mark[r] = n + r;      // every earlier mark is below n + r
+    for (std::size_t e = rowStart[r]; e < rowStart[r + 1]; ++e) {
+      auto k = static_cast<std::size_t>(lowerColumn[e]);
+      work[k] = lowerValue[e];
+      std::size_t length = 0;
+      for (; mark[k] != n + r; k = static_cast<std::size_t>(parent[k])) {
+        mark[k] = n + r;
+        path[length++] = static_cast<std::int32_t>(k);
       }
+      while (length > 0) order[--top] = path[--length];
     }
-    std::sort(pattern.begin(), pattern.end());
-    for (const std::int32_t k : pattern) work[static_cast<std::size_t>(k)] = 0.0;
-
-    // Sparse forward solve of L x = (row r), each value kept divided by its column's diagonal: columns
-    // are final when reached in ascending order, and each correction lands on a later column.
-    for (std::size_t e = begin; e < last; ++e) {
-      const auto c = static_cast<std::size_t>(permuted[e].first);
-      work[c] = invD[c] * permuted[e].second;
-    }
-    for (const std::int32_t k : pattern) {
-      const double x = work[static_cast<std::size_t>(k)];
-      for (const auto& [q, l] : factor->factorColumns[static_cast<std::size_t>(k)]) {
-        work[static_cast<std::size_t>(q)] -= l * x * invD[static_cast<std::size_t>(q)];
-      }
-    }
-
-    double d = permuted[last].second;
-    SparseRow& factorRow = factor->factorRows[r];
-    for (const std::int32_t k : pattern) {
-      const double x = work[static_cast<std::size_t>(k)];
-      d = d - x * x;
-      factorRow.emplace_back(k, x);
-      factor->factorColumns[static_cast<std::size_t>(k)].emplace_back(static_cast<std::int32_t>(r), x);
+    double d = pivot[r];
+    for (std::size_t t = top; t < n; ++t) {
+      const auto k = static_cast<std::size_t>(order[t]);
+      const double x = work[k] / diagonal[k];
+      work[k] = 0.0;
+      const std::size_t end = next[k];
+      for (std::size_t p = columnStart[k]; p < end; ++p)
+        work[static_cast<std::size_t>(rowIndex[p])] -= value[p] * x;
+      d -= x * x;
+      rowIndex[end] = static_cast<std::int32_t>(r);
+      value[end] = x;
+      next[k] = end + 1;
     }
     // Written as a negated test so that a NaN pivot fails too.
     if (!(d > 0.0)) return nullptr;
-    factor->diagonal[r] = std::sqrt(d);
-    invD[r] = 1.0 / factor->diagonal[r];
+    factor.diagonal[r] = std::sqrt(d);
   }
-  return factor;
+  result->supernodes_ = findSupernodes(factor);
+  return result;
 }
 
 }  // namespace TessikSDK::Cholesky

@@ -12,6 +12,7 @@
 
 namespace {
 
+using TessikSDK::Cholesky::CompressedFactor;
 using TessikSDK::Cholesky::factorLLT;
 using TessikSDK::Cholesky::minimumDegreeOrder;
 using TessikSDK::Cholesky::SparseRow;
@@ -150,6 +151,18 @@ TEST(LLTRejects, RowWithUnorderedColumns) {
   EXPECT_EQ(factorLLT({{{0, 4.0}}, {{-1, 1.0}, {1, 4.0}}}), nullptr);
 }
 
+TEST(LLTRejects, BlockOfWrongShapeIsLeftAlone) {
+  const auto factor = factorLLT({{{0, 4.0}}, {{0, 2.0}, {1, 5.0}}});
+  ASSERT_NE(factor, nullptr);
+  const std::pair<std::vector<double>, std::size_t> cases[] = {
+      {{6.0, 9.0}, 0}, {{6.0, 9.0, 1.0}, 2}, {{6.0, 9.0, 1.0, 2.0, 3.0, 4.0}, 2}, {{6.0, 9.0, 1.0}, 1}};
+  for (const auto& [original, columns] : cases) {
+    std::vector<double> block = original;
+    EXPECT_FALSE(factor->solve(block, columns)) << columns;
+    EXPECT_EQ(block, original) << columns;
+  }
+}
+
 TEST(LLTRejects, WrongLengthRightHandSideIsLeftAlone) {
   const auto factor = factorLLT({{{0, 4.0}}, {{0, 2.0}, {1, 5.0}}});
   ASSERT_NE(factor, nullptr);
@@ -173,6 +186,18 @@ std::set<Edge> caseGraph(const RandomCase& c, std::mt19937& rng) {
   return c.edges == 0 ? gridGraph(20, c.n / 20) : randomGraph(c.n, c.edges, rng);
 }
 
+double relativeResidual(const SparseSymmetricMatrix& m,
+                        const std::vector<double>& x,
+                        const std::vector<double>& b) {
+  const std::vector<double> mx = multiply(m, x);
+  double residual = 0.0, norm = 0.0;
+  for (std::size_t i = 0; i < b.size(); ++i) {
+    residual += (mx[i] - b[i]) * (mx[i] - b[i]);
+    norm += b[i] * b[i];
+  }
+  return std::sqrt(residual / norm);
+}
+
 TEST(LLTRandomSystems, SolveReproducesRightHandSide) {
   std::mt19937 rng(20240611);
   for (const RandomCase& c : kRandomCases) {
@@ -184,13 +209,101 @@ TEST(LLTRandomSystems, SolveReproducesRightHandSide) {
       for (double& value : b) value = unit(rng) - 0.5;
       std::vector<double> x = b;
       ASSERT_TRUE(factor->solve(x));
-      const std::vector<double> mx = multiply(m, x);
-      double residual = 0.0, norm = 0.0;
-      for (std::size_t i = 0; i < b.size(); ++i) {
-        residual += (mx[i] - b[i]) * (mx[i] - b[i]);
-        norm += b[i] * b[i];
+      EXPECT_LE(relativeResidual(m, x, b), 1e-9) << c.name;
+    }
+  }
+}
+
+// The textbook dense Cholesky of P M P^T, column by column, to hold the sparse factor against.
+std::vector<std::vector<double>> denseFactor(const SparseSymmetricMatrix& m,
+                                             const std::vector<std::int32_t>& p) {
+  const std::size_t n = m.size();
+  std::vector<std::vector<double>> a(n, std::vector<double>(n, 0.0));
+  for (std::size_t r = 0; r < n; ++r) {
+    for (const auto& [c, value] : m[r]) {
+      const auto i = static_cast<std::size_t>(p[r]),
+                 j = static_cast<std::size_t>(p[static_cast<std::size_t>(c)]);
+      a[std::max(i, j)][std::min(i, j)] = value;
+    }
+  }
+  for (std::size_t j = 0; j < n; ++j) {
+    for (std::size_t k = 0; k < j; ++k) a[j][j] -= a[j][k] * a[j][k];
+    a[j][j] = std::sqrt(a[j][j]);
+    for (std::size_t i = j + 1; i < n; ++i) {
+      for (std::size_t k = 0; k < j; ++k) a[i][j] -= a[i][k] * a[j][k];
+      a[i][j] /= a[j][j];
+    }
+  }
+  return a;
+}
+
+// Every entry of L, stored or not, against the dense factor: a dropped fill entry, a misplaced row or a
+// wrong value all show. The tolerance is relative to L's largest entry.
+TEST(LLTRandomSystems, FactorMatchesDenseReference) {
+  std::mt19937 rng(99);
+  for (const RandomCase& c : kRandomCases) {
+    const SparseSymmetricMatrix m = laplacianPlusDiagonal(c.n, caseGraph(c, rng), rng);
+    const auto factor = factorLLT(m);
+    ASSERT_NE(factor, nullptr) << c.name;
+    const CompressedFactor& l = factor->factor();
+    ASSERT_EQ(l.permutation, minimumDegreeOrder(m)) << c.name;
+    std::vector<std::vector<double>> sparse(m.size(), std::vector<double>(m.size(), 0.0));
+    for (std::size_t j = 0; j < m.size(); ++j) {
+      sparse[j][j] = l.diagonal[j];
+      for (std::size_t e = l.columnStart[j]; e < l.columnStart[j + 1]; ++e) {
+        const auto i = static_cast<std::size_t>(l.rowIndex[e]);
+        ASSERT_GT(i, j) << c.name;
+        if (e > l.columnStart[j]) {
+          ASSERT_GT(l.rowIndex[e], l.rowIndex[e - 1]) << c.name;
+        }
+        sparse[i][j] = l.value[e];
       }
-      EXPECT_LE(std::sqrt(residual / norm), 1e-9) << c.name;
+    }
+    const std::vector<std::vector<double>> dense = denseFactor(m, l.permutation);
+    double largest = 0.0, error = 0.0;
+    for (std::size_t i = 0; i < m.size(); ++i) {
+      for (std::size_t j = 0; j <= i; ++j) {
+        largest = std::max(largest, std::abs(dense[i][j]));
+        error = std::max(error, std::abs(sparse[i][j] - dense[i][j]));
+      }
+    }
+    EXPECT_LE(error, 1e-12 * largest) << c.name;
+  }
+}
+
+// Each column of a block is zero above its own permuted row, the shape of the heat sources' right-hand
+// sides. Every column must match its single solve bit for bit and solve the system.
+TEST(LLTRandomSystems, BlockSolveMatchesSingleSolvesWithLeadingZeros) {
+  std::mt19937 rng(5);
+  for (const RandomCase& c : kRandomCases) {
+    const SparseSymmetricMatrix m = laplacianPlusDiagonal(c.n, caseGraph(c, rng), rng);
+    const auto factor = factorLLT(m);
+    ASSERT_NE(factor, nullptr) << c.name;
+    const std::vector<std::int32_t>& p = factor->factor().permutation;
+    const std::size_t n = m.size(), columns = 5;
+    std::vector<double> block(n * columns);
+    for (std::size_t k = 0; k < columns; ++k) {
+      // Thresholds 0, n/4, ... n: the first column has no leading zero, the last is zero throughout.
+      const std::size_t zeroBelow = n * k / (columns - 1);
+      for (std::size_t i = 0; i < n; ++i) {
+        block[i * columns + k] = static_cast<std::size_t>(p[i]) >= zeroBelow ? unit(rng) - 0.5 : 0.0;
+      }
+    }
+    std::vector<double> solved = block;
+    ASSERT_TRUE(factor->solve(solved, columns));
+    for (std::size_t k = 0; k < columns; ++k) {
+      std::vector<double> b(n), x(n), fromBlock(n);
+      for (std::size_t i = 0; i < n; ++i) {
+        b[i] = x[i] = block[i * columns + k];
+        fromBlock[i] = solved[i * columns + k];
+      }
+      ASSERT_TRUE(factor->solve(x));
+      EXPECT_EQ(fromBlock, x) << c.name << " column " << k;
+      if (k + 1 < columns) {
+        EXPECT_LE(relativeResidual(m, x, b), 1e-9) << c.name << " column " << k;
+      } else {
+        EXPECT_EQ(x, std::vector<double>(n, 0.0)) << c.name;
+      }
     }
   }
 }

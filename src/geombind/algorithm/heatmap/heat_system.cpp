@@ -92,18 +92,24 @@ bool solveHeat(const MeshData& mesh,
   if (factor == nullptr) return false;
 
   output.resize(vertexCount);
-  std::vector<double> x(vertexCount);
-  for (std::size_t j = 0; j < visibility.sourceCount; ++j) {
-    for (std::size_t i = 0; i < vertexCount; ++i) {
-      const bool heats = system.nearestSource[i] >= 0 && visibility.isVisible(i, j) &&
-                         visibility.distance(i, static_cast<std::size_t>(system.nearestSource[i])) * 1.0001 >=
-                             visibility.distance(i, j);
+  const std::size_t sources = visibility.sourceCount;
+  if (sources == 0) return true;
+  // All sources in one block, so each sweep reads the factor once for every source.
+  std::vector<double> block(vertexCount * sources);
+  for (std::size_t i = 0; i < vertexCount; ++i) {
+    if (system.nearestSource[i] < 0) continue;
+    const double nearest = visibility.distance(i, static_cast<std::size_t>(system.nearestSource[i]));
+    for (std::size_t j = 0; j < sources; ++j) {
       // Every tied source gets the vertex's whole heat term, not a share of it.
-      x[i] = heats ? system.vertexArea[i] * system.heatValue[i] : 0.0;
+      if (visibility.isVisible(i, j) && nearest * 1.0001 >= visibility.distance(i, j)) {
+        block[i * sources + j] = system.vertexArea[i] * system.heatValue[i];
+      }
     }
-    factor->solve(x);
-    for (std::size_t i = 0; i < vertexCount; ++i) {
-      const double w = std::min(x[i], 1.0);
+  }
+  factor->solve(block, sources);
+  for (std::size_t i = 0; i < vertexCount; ++i) {
+    for (std::size_t j = 0; j < sources; ++j) {
+      const double w = std::min(block[i * sources + j], 1.0);
       if (w > 1e-8) output[i].push_back(BoneWeight{static_cast<std::uint32_t>(j), w});
     }
   }

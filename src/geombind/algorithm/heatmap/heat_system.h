@@ -29,8 +29,8 @@ HeatSystem assembleHeatSystem(const MeshData& mesh,
                               const std::vector<double>& triangleAreas,
                               const SourceVisibility& visibility);
 
-/// Factorises once and solves once per source. Output: per vertex, (source, weight) in ascending source
-/// order for every solution value above 1e-8, clipped at 1. False when the mesh has no vertices or the
+/// Factorises once and solves all sources as one block. Output: per vertex, (source, weight) in ascending
+/// source order for every solution value above 1e-8, clipped at 1. False when the mesh has no vertices or the
 /// matrix is not positive definite; the output is then empty.
 bool solveHeat(const MeshData& mesh,
                const std::vector<double>& triangleAreas,
