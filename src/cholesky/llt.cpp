@@ -8,6 +8,8 @@
 #include <utility>
 #include <vector>
 
+#include <omp.h>
+
 namespace TessikSDK::Cholesky {
 
 LLTMatrix::~LLTMatrix() = default;
@@ -24,6 +26,9 @@ class LLTMatrixImpl final : public LLTMatrix {
   CompressedFactor factor_;
   std::vector<std::size_t> supernodes_;  // first column of each supernode, then n
 };
+
+// Below this many right-hand sides per thread, a second thread streaming L costs more than it saves.
+constexpr std::size_t kColumnsPerThread = 8;
 
 // Caps a supernode's width so that its columns' part of the block stays in cache for a wide block.
 constexpr std::size_t kMaxSupernode = 32;
@@ -87,6 +92,7 @@ struct SweepScratch {
 void forwardSweep(const CompressedFactor& factor,
                   const std::vector<std::size_t>& supernodes,
                   double* y,
+                  std::size_t stride,
                   std::size_t m,
                   std::size_t firstRow,
                   SweepScratch& scratch) {
@@ -100,17 +106,18 @@ void forwardSweep(const CompressedFactor& factor,
   for (; s + 1 < supernodes.size(); ++s) {
     const std::size_t f = supernodes[s], l = supernodes[s + 1] - 1;
     bool nonzero = false;
-    for (std::size_t c = f * m; c < (l + 1) * m; ++c) nonzero |= y[c] != 0.0;
+    for (std::size_t j = f; j <= l; ++j)
+      for (std::size_t c = 0; c < m; ++c) nonzero |= y[j * stride + c] != 0.0;
     // A zero stretch stays zero and changes no later row; the heat sources' right-hand sides are mostly
     // zero.
     if (!nonzero) continue;
     scratch.rows.clear();
     for (std::size_t j = f; j <= l; ++j) {
-      double* yj = y + j * m;
+      double* yj = y + j * stride;
       for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
       for (std::size_t i = j + 1; i <= l; ++i) {
         const double v = values[start[j] + (i - j - 1)];
-        double* yi = y + i * m;
+        double* yi = y + i * stride;
         for (std::size_t c = 0; c < m; ++c) yi[c] -= yj[c] * v;
       }
       scratch.rows.push_back(yj);
@@ -121,7 +128,7 @@ void forwardSweep(const CompressedFactor& factor,
     scratch.weights.resize(width);
     for (std::size_t q = 0; q < shared; ++q) {
       for (std::size_t j = f; j <= l; ++j) scratch.weights[j - f] = values[start[j] + (l - j) + q];
-      subtractProducts(y + static_cast<std::size_t>(rows[start[l] + q]) * m, scratch.rows.data(),
+      subtractProducts(y + static_cast<std::size_t>(rows[start[l] + q]) * stride, scratch.rows.data(),
                        scratch.weights.data(), width, m);
     }
   }
@@ -130,6 +137,7 @@ void forwardSweep(const CompressedFactor& factor,
 void backwardSweep(const CompressedFactor& factor,
                    const std::vector<std::size_t>& supernodes,
                    double* y,
+                   std::size_t stride,
                    std::size_t m,
                    SweepScratch& scratch) {
   const std::size_t* start = factor.columnStart.data();
@@ -142,15 +150,15 @@ void backwardSweep(const CompressedFactor& factor,
     const std::size_t shared = start[l + 1] - start[l];
     scratch.rows.resize(shared);
     for (std::size_t q = 0; q < shared; ++q)
-      scratch.rows[q] = y + static_cast<std::size_t>(rows[start[l] + q]) * m;
+      scratch.rows[q] = y + static_cast<std::size_t>(rows[start[l] + q]) * stride;
     for (std::size_t j = f; j <= l; ++j) {
-      subtractProducts(y + j * m, scratch.rows.data(), values + start[j] + (l - j), shared, m);
+      subtractProducts(y + j * stride, scratch.rows.data(), values + start[j] + (l - j), shared, m);
     }
     for (std::size_t j = l + 1; j-- > f;) {
-      double* yj = y + j * m;
+      double* yj = y + j * stride;
       for (std::size_t i = j + 1; i <= l; ++i) {
         const double v = values[start[j] + (i - j - 1)];
-        const double* yi = y + i * m;
+        const double* yi = y + i * stride;
         for (std::size_t c = 0; c < m; ++c) yj[c] -= yi[c] * v;
       }
       for (std::size_t c = 0; c < m; ++c) yj[c] /= diagonal[j];
@@ -192,9 +200,21 @@ bool LLTMatrixImpl::solve(std::vector<double>& block, std::size_t columns) const
     std::copy(carry.begin(), carry.end(), y + i * m);
   }
 
-  SweepScratch scratch;
-  forwardSweep(factor_, supernodes_, y, m, first, scratch);
-  backwardSweep(factor_, supernodes_, y, m, scratch);
+  // Wide blocks are split into groups of columns, one per thread, each swept over its own columns of the
+  // shared rows: a column sees the same operations whichever group it is in, so the result does not
+  // depend on the thread count.
+  const int threads = omp_get_max_threads();
+  const std::size_t groups = std::max<std::size_t>(
+      1, std::min<std::size_t>(static_cast<std::size_t>(threads), m / kColumnsPerThread));
+  const auto groupCount = static_cast<std::int64_t>(groups);
+#pragma omp parallel for schedule(static, 1) num_threads(static_cast <int>(groups)) if (groups > 1)
+  for (std::int64_t g = 0; g < groupCount; ++g) {
+    const std::size_t begin = m * static_cast<std::size_t>(g) / groups;
+    const std::size_t end = m * static_cast<std::size_t>(g + 1) / groups;
+    SweepScratch scratch;
+    forwardSweep(factor_, supernodes_, y + begin, m, end - begin, first, scratch);
+    backwardSweep(factor_, supernodes_, y + begin, m, end - begin, scratch);
+  }
 
   for (std::size_t i = 0; i < n; ++i) {  // row i comes back from permutation[i]
     if (!moved[i]) continue;

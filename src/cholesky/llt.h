@@ -39,7 +39,9 @@ class LLTMatrix {
   /// `columns` values, input row order, the right-hand sides of one row adjacent) and X on return. Each
   /// column's result equals solving it alone, bit for bit but for the sign of a zero: it sees the same
   /// operations in the same order. False, block unchanged, when `columns` is 0 or the block's size is
-  /// not size() * columns. Threads: none of its own; the caller may run several at once.
+  /// not size() * columns. A wide block is split by columns over OpenMP's threads; since a column's result
+  /// does not depend on its neighbours, it does not depend on the thread count either. Callers may run
+  /// several solves at once.
   virtual bool solve(std::vector<double>& block, std::size_t columns) const = 0;
   /// The factor itself, for callers that need L rather than solutions.
   virtual const CompressedFactor& factor() const = 0;

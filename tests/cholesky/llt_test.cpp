@@ -9,6 +9,7 @@
 #include <vector>
 
 #include <gtest/gtest.h>
+#include <omp.h>
 
 namespace {
 
@@ -272,15 +273,17 @@ TEST(LLTRandomSystems, FactorMatchesDenseReference) {
 }
 
 // Each column of a block is zero above its own permuted row, the shape of the heat sources' right-hand
-// sides. Every column must match its single solve bit for bit and solve the system.
+// sides. Every column must match its single solve bit for bit and solve the system, and the block, wide
+// enough to be split over threads, must come out the same for any thread count.
 TEST(LLTRandomSystems, BlockSolveMatchesSingleSolvesWithLeadingZeros) {
+  const int defaultThreads = omp_get_max_threads();
   std::mt19937 rng(5);
   for (const RandomCase& c : kRandomCases) {
     const SparseSymmetricMatrix m = laplacianPlusDiagonal(c.n, caseGraph(c, rng), rng);
     const auto factor = factorLLT(m);
     ASSERT_NE(factor, nullptr) << c.name;
     const std::vector<std::int32_t>& p = factor->factor().permutation;
-    const std::size_t n = m.size(), columns = 5;
+    const std::size_t n = m.size(), columns = 20;
     std::vector<double> block(n * columns);
     for (std::size_t k = 0; k < columns; ++k) {
       // Thresholds 0, n/4, ... n: the first column has no leading zero, the last is zero throughout.
@@ -290,7 +293,15 @@ TEST(LLTRandomSystems, BlockSolveMatchesSingleSolvesWithLeadingZeros) {
       }
     }
     std::vector<double> solved = block;
+    omp_set_num_threads(1);
     ASSERT_TRUE(factor->solve(solved, columns));
+    for (int threads : {2, 3, 4}) {
+      std::vector<double> again = block;
+      omp_set_num_threads(threads);
+      ASSERT_TRUE(factor->solve(again, columns));
+      EXPECT_EQ(again, solved) << c.name << " on " << threads << " threads";
+    }
+    omp_set_num_threads(defaultThreads);
     for (std::size_t k = 0; k < columns; ++k) {
       std::vector<double> b(n), x(n), fromBlock(n);
       for (std::size_t i = 0; i < n; ++i) {
