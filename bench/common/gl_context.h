@@ -3,8 +3,7 @@
 #include <optional>
 #include <string>
 
-#include <GL/glew.h>
-
+#include "gl/gl_api.h"
 #include "headless_gl/headless_gl.h"
 
 // The benchmarks' one headless OpenGL context, made on first use so that a run filtered down to nothing

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <memory>
 
-#include <GL/glew.h>
+#include <dlfcn.h>
 
 #include "geombind/algorithm/geodesic/geodesic_sparse_voxel_bind.h"
 #include "geombind/algorithm/heatmap/heatmap_bind.h"
@@ -11,19 +11,23 @@
 #include "geombind/preparation.h"
 #include "geombind/progress.h"
 #include "geombind/transform_hierarchy.h"
+#include "gl/gl_api.h"
 
 namespace TessikSDK::GeomBind {
 
 namespace {
 
-// Debian's GLEW is built for GLX. In a context made through EGL it loads every GL entry point and then
-// fails only its GLX part with this code; the GL side is fully usable.
-bool glewReady(GLenum status) {
-#if defined(_WIN32)
-  return status == GLEW_OK;
-#else
-  return status == GLEW_OK || status == GLEW_ERROR_NO_GLX_DISPLAY;
-#endif
+// Hosts that use GLEW have always found it initialised by the context's creation; keep that when GLEW
+// is in the process, without ever loading it ourselves.
+void initialiseHostGlew() {
+  for (const char* name : {"libGLEW.so.2.2", "libGLEW.so.2.1", "libGLEW.so"}) {
+    void* glew = dlopen(name, RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD);
+    if (glew == nullptr) continue;
+    using Init = GLenum (*)();
+    if (auto init = reinterpret_cast<Init>(dlsym(glew, "glewInit"))) init();
+    dlclose(glew);  // only drops the reference RTLD_NOLOAD took
+    return;
+  }
 }
 
 // The host's objects, validated before anything is changed: a mesh the methods could not read safely
@@ -61,8 +65,9 @@ IContext::~IContext() = default;
 
 IContext* IContext::create() {
   auto context = std::make_unique<ContextImpl>();
-  if (!glewReady(glewInit())) return nullptr;
-  if (!glewIsSupported("GL_VERSION_2_1")) return nullptr;
+  // Without a current context the version string is null, so this also refuses a thread with none.
+  if (!GL::load() || !GL::versionAtLeast(2, 1)) return nullptr;
+  initialiseHostGlew();
   return context.release();
 }
 

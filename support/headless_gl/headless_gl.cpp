@@ -3,17 +3,85 @@
 #include <cctype>
 #include <map>
 #include <mutex>
+#include <type_traits>
 #include <utility>
 
-// GLEW must come before any other GL header, which the include sorting would not keep.
+#include <dlfcn.h>
+
+// The GL table's header brings GLEW's, which must come before any other GL header.
 // clang-format off
-#include <GL/glew.h>
+#include "gl/gl_api.h"
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
-#include <GL/gl.h>
 // clang-format on
 
 namespace tessik::support {
+namespace {
+
+// EGL is opened at run time, like GL itself: a program that never asks for a context never needs it.
+struct EglApi {
+  decltype(&::eglGetProcAddress) GetProcAddress = nullptr;
+  decltype(&::eglGetError) GetError = nullptr;
+  decltype(&::eglGetDisplay) GetDisplay = nullptr;
+  decltype(&::eglInitialize) Initialize = nullptr;
+  decltype(&::eglTerminate) Terminate = nullptr;
+  decltype(&::eglBindAPI) BindAPI = nullptr;
+  decltype(&::eglQueryAPI) QueryAPI = nullptr;
+  decltype(&::eglChooseConfig) ChooseConfig = nullptr;
+  decltype(&::eglCreateContext) CreateContext = nullptr;
+  decltype(&::eglDestroyContext) DestroyContext = nullptr;
+  decltype(&::eglMakeCurrent) MakeCurrent = nullptr;
+  decltype(&::eglGetCurrentContext) GetCurrentContext = nullptr;
+  bool ok = false;
+};
+
+EglApi loadEgl() {
+  EglApi api;
+  void* library = dlopen("libEGL.so.1", RTLD_NOW | RTLD_LOCAL);  // kept open for the process's life
+  if (library == nullptr) return api;
+  bool all = true;
+  auto get = [&](auto& entry, const char* name) {
+    entry = reinterpret_cast<std::remove_reference_t<decltype(entry)>>(dlsym(library, name));
+    all = all && entry != nullptr;
+  };
+  get(api.GetProcAddress, "eglGetProcAddress");
+  get(api.GetError, "eglGetError");
+  get(api.GetDisplay, "eglGetDisplay");
+  get(api.Initialize, "eglInitialize");
+  get(api.Terminate, "eglTerminate");
+  get(api.BindAPI, "eglBindAPI");
+  get(api.QueryAPI, "eglQueryAPI");
+  get(api.ChooseConfig, "eglChooseConfig");
+  get(api.CreateContext, "eglCreateContext");
+  get(api.DestroyContext, "eglDestroyContext");
+  get(api.MakeCurrent, "eglMakeCurrent");
+  get(api.GetCurrentContext, "eglGetCurrentContext");
+  api.ok = all;
+  return api;
+}
+
+const EglApi& egl() {
+  static const EglApi api = loadEgl();
+  return api;
+}
+
+}  // namespace
+
+// clang-format off
+#define eglGetProcAddress (egl().GetProcAddress)
+#define eglGetError (egl().GetError)
+#define eglGetDisplay (egl().GetDisplay)
+#define eglInitialize (egl().Initialize)
+#define eglTerminate (egl().Terminate)
+#define eglBindAPI (egl().BindAPI)
+#define eglQueryAPI (egl().QueryAPI)
+#define eglChooseConfig (egl().ChooseConfig)
+#define eglCreateContext (egl().CreateContext)
+#define eglDestroyContext (egl().DestroyContext)
+#define eglMakeCurrent (egl().MakeCurrent)
+#define eglGetCurrentContext (egl().GetCurrentContext)
+// clang-format on
+
 namespace {
 
 constexpr const char* kInstallHint =
@@ -184,6 +252,8 @@ bool versionAtLeast(const GLVersion& version, int major, int minor) {
 }
 
 std::string currentGLVersionString() {
+  // No GL library, no context.
+  if (!TessikSDK::GL::load()) return std::string();
   const GLubyte* text = glGetString(GL_VERSION);
   return text == nullptr ? std::string() : std::string(reinterpret_cast<const char*>(text));
 }
@@ -198,6 +268,13 @@ std::optional<HeadlessGLContext> HeadlessGLContext::create(std::string* error) {
   std::string log;
   std::string why;
   EGLContext context = EGL_NO_CONTEXT;
+  if (!egl().ok) {
+    if (error != nullptr)
+      *error =
+          std::string("no headless OpenGL context could be created: libEGL.so.1 could not be loaded.\n") +
+          kInstallHint;
+    return std::nullopt;
+  }
 
   auto getPlatformDisplay =
       reinterpret_cast<PFNEGLGETPLATFORMDISPLAYEXTPROC>(eglGetProcAddress("eglGetPlatformDisplayEXT"));
@@ -266,7 +343,7 @@ bool HeadlessGLContext::makeCurrent() const {
 }
 
 bool HeadlessGLContext::isCurrent() const {
-  if (context_ == nullptr) return false;
+  if (context_ == nullptr || !egl().ok) return false;
   ScopedOpenGLApi api;
   return eglGetCurrentContext() == context_;
 }
@@ -296,13 +373,8 @@ bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error)
     made = HeadlessGLContext::create(error);
     if (!made.has_value()) return false;
   }
-  // Debian's GLEW is built for GLX: in an EGL context it loads every entry point, then reports only that
-  // it found no X display.
-  const GLenum glew = glewInit();
-  if (glew != GLEW_OK && glew != GLEW_ERROR_NO_GLX_DISPLAY) {
-    if (error != nullptr)
-      *error = std::string("OpenGL entry points could not be loaded: ") +
-               reinterpret_cast<const char*>(glewGetErrorString(glew));
+  if (std::string why; !TessikSDK::GL::load(&why)) {
+    if (error != nullptr) *error = "OpenGL entry points could not be loaded: " + why;
     made.reset();
     return false;
   }

@@ -60,7 +60,7 @@ class HeadlessGLContext {
 
 // The one way hosts (tools, Python, tests, benchmarks) get a context to bind in: the context already
 // current on this thread if there is one, otherwise a headless one, made current and stored in `made`
-// (keep it alive while binding). GLEW's entry points are loaded either way. Answers false, with the
+// (keep it alive while binding). The GL entry points of gl/gl_api.h are loaded either way. Answers false, with the
 // reason in `error` when it is not null, when neither works.
 bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error);
 

@@ -8,9 +8,9 @@
 #include <vector>
 
 #include <EGL/egl.h>
-#include <GL/glew.h>
 #include <gtest/gtest.h>
 
+#include "gl/gl_api.h"
 #include "support/gl_context_fixture.h"
 
 namespace {

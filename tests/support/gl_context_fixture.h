@@ -4,9 +4,9 @@
 #include <optional>
 #include <string>
 
-#include <GL/glew.h>
 #include <gtest/gtest.h>
 
+#include "gl/gl_api.h"
 #include "headless_gl/headless_gl.h"
 
 namespace tessik::test {

@@ -9,10 +9,10 @@
 #include <string>
 #include <vector>
 
-#include <GL/glew.h>
 #include <gtest/gtest.h>
 #include <stb_image.h>
 
+#include "gl/gl_api.h"
 #include "pose.h"
 #include "support/gl_context_fixture.h"
 

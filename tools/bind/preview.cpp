@@ -9,9 +9,9 @@
 #include <cstring>
 #include <stdexcept>
 
-#include <GL/glew.h>
 #include <stb_image_write.h>
 
+#include "gl/gl_api.h"
 #include "headless_gl/headless_gl.h"
 #include "pose.h"
 
@@ -72,7 +72,7 @@ struct FramebufferApi {
 
 FramebufferApi findFramebufferApi() {
   FramebufferApi api;
-  if (support::glVersionAtLeast(3, 0) || GLEW_ARB_framebuffer_object) {
+  if (support::glVersionAtLeast(3, 0) || TessikSDK::GL::hasExtension("GL_ARB_framebuffer_object")) {
     api = {glGenFramebuffers,        glDeleteFramebuffers,
            glBindFramebuffer,        glGenRenderbuffers,
            glDeleteRenderbuffers,    glBindRenderbuffer,
@@ -80,7 +80,7 @@ FramebufferApi findFramebufferApi() {
            glCheckFramebufferStatus, true};
     if (api.loaded()) return api;
   }
-  if (GLEW_EXT_framebuffer_object) {
+  if (TessikSDK::GL::hasExtension("GL_EXT_framebuffer_object")) {
     api = {glGenFramebuffersEXT,        glDeleteFramebuffersEXT,
            glBindFramebufferEXT,        glGenRenderbuffersEXT,
            glDeleteRenderbuffersEXT,    glBindRenderbufferEXT,
@@ -89,8 +89,7 @@ FramebufferApi findFramebufferApi() {
     if (api.loaded()) return api;
   }
   throw std::runtime_error(
-      "the preview needs OpenGL framebuffer objects, which the current context does not offer (or GLEW was "
-      "not initialised for it)");
+      "the preview needs OpenGL framebuffer objects, which the current context does not offer");
 }
 
 // Puts back everything the preview changes, in reverse order, whether rendering finishes or throws.
@@ -99,7 +98,8 @@ class SavedGLState {
   explicit SavedGLState(const FramebufferApi& api) : api_(api) {
     // Client arrays are read only with no vertex array object and no buffers bound; the element-array
     // binding belongs to the vertex array object, so it is read after switching to the default one.
-    hasVertexArrays_ = support::glVersionAtLeast(3, 0) || GLEW_ARB_vertex_array_object;
+    hasVertexArrays_ =
+        support::glVersionAtLeast(3, 0) || TessikSDK::GL::hasExtension("GL_ARB_vertex_array_object");
     if (hasVertexArrays_) {
       glGetIntegerv(GL_VERTEX_ARRAY_BINDING, &vertexArray_);
       glBindVertexArray(0);

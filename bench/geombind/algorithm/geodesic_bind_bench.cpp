@@ -29,7 +29,6 @@
 #include <utility>
 #include <vector>
 
-#include <GL/glew.h>
 #include <benchmark/benchmark.h>
 #include <sys/resource.h>
 
@@ -43,6 +42,7 @@
 #include "geombind/mesh.h"
 #include "geombind/preparation.h"
 #include "geombind/transform_hierarchy.h"
+#include "gl/gl_api.h"
 #include "meshes/character.h"
 
 namespace {

@@ -24,7 +24,6 @@
 #include <string>
 #include <vector>
 
-#include <GL/glew.h>
 #include <benchmark/benchmark.h>
 #include <glm/vec3.hpp>
 #include <omp.h>
@@ -34,6 +33,7 @@
 #include "geombind/gpu/slice_voxelizer.h"
 #include "geombind/mesh.h"
 #include "geombind/voxel_bit_grid.h"
+#include "gl/gl_api.h"
 #include "meshes/mesh_builders.h"
 
 namespace {

@@ -8,11 +8,11 @@
 #include <string>
 #include <vector>
 
-#include <GL/glew.h>
+#include "gl/gl_api.h"
 
 // Owning wrappers of the OpenGL objects the voxelizer needs. Each holds one GL name, deletes it on
 // destruction after the matching glIs... test, and is used only on the thread whose GL context is
-// current. Entry points beyond OpenGL 1.1 come from GLEW, initialised by the binding context.
+// current. The entry points come from the table of gl/gl_api.h, loaded on first use.
 namespace TessikSDK::GeomBind::Gpu {
 
 /// Component count, pixel format and pixel type of a texture internal format.

@@ -3,6 +3,8 @@
 #include <chrono>
 #include <cmath>
 #include <cstring>
+#include <iostream>
+#include <string>
 
 #include "geombind/gpu/shader_sources.h"
 #include "geombind/parallel.h"
@@ -368,6 +370,11 @@ bool castAxisVotes(const MeshData& mesh,
                    AxisVoteGrid& votes,
                    const ShaderSources& shaders,
                    SweepTimings* timings) {
+  // No GL library, no sweeps: report it as the shader library reports its failures.
+  if (std::string why; !GL::load(&why)) {
+    std::cerr << "voxelizer: " << why << "\n";
+    return false;
+  }
   SliceVoxelizer voxelizer;
   if (!voxelizer.createPrograms(shaders)) return false;
   voxelizer.timings = timings;

@@ -15,7 +15,7 @@ namespace TessikSDK::GeomBind::Gpu {
 
 /// Sets the bit of every voxel of `grid` whose cell lies inside the closed mesh; bits already set stay.
 /// The grid spans mesh.boundingBox. Renders on the GPU through the OpenGL context current on this thread
-/// (version 2.1, GLEW initialised): six sweeps of orthographic slices, two axis votes out of three make
+/// (version 2.1): six sweeps of orthographic slices, two axis votes out of three make
 /// a voxel inside. With `refineInterior`, voxels with exactly one vote are inside when the winding number
 /// at their centre exceeds `windingThreshold`. An empty mesh returns without touching GL; a shader that
 /// fails to build is reported on std::cerr and leaves the grid as it was.

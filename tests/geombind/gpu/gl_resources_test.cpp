@@ -10,9 +10,9 @@
 #include <utility>
 #include <vector>
 
-#include <GL/glew.h>
 #include <gtest/gtest.h>
 
+#include "gl/gl_api.h"
 #include "support/gl_context_fixture.h"
 
 namespace TessikSDK::GeomBind::Gpu {
