@@ -38,7 +38,9 @@
 
 namespace {
 
+using TessikSDK::GeomBind::AxisVoteGrid;
 using TessikSDK::GeomBind::IProgress;
+using TessikSDK::GeomBind::kAxisVoteMasks;
 using TessikSDK::GeomBind::MeshData;
 using TessikSDK::GeomBind::VoxelBitGrid;
 using TessikSDK::GeomBind::Collision::AABB;
@@ -110,18 +112,18 @@ void BM_VoxelizeInterior(benchmark::State& state) {
     Gpu::voxelizeInterior(progress, mesh, grid, false, 0.0f);
 
     state.PauseTiming();
-    Gpu::AxisVoteGrid votes{dims, std::vector<std::uint8_t>(static_cast<std::size_t>(grid.cellCount()), 0)};
+    AxisVoteGrid votes{dims, std::vector<std::uint8_t>(static_cast<std::size_t>(grid.cellCount()), 0)};
     castFailed = !Gpu::castAxisVotes(mesh, votes, Gpu::builtinShaders(), &sweeps);
     if (!castFailed) {
       VoxelBitGrid fresh(n, n, n);
       std::vector<std::uint32_t> ambiguous;
       const auto start = std::chrono::steady_clock::now();
-      Gpu::classifyVotes(progress, votes, fresh, false, ambiguous);
+      TessikSDK::GeomBind::classifyVotes(progress, votes, fresh, false, ambiguous);
       classifySeconds += SecondsSince(start);
       oneVote = 0;
       for (std::uint8_t v : votes.votes) {
-        const int axes = ((v & Gpu::kAxisVoteMasks[0]) != 0) + ((v & Gpu::kAxisVoteMasks[1]) != 0) +
-                         ((v & Gpu::kAxisVoteMasks[2]) != 0);
+        const int axes =
+            ((v & kAxisVoteMasks[0]) != 0) + ((v & kAxisVoteMasks[1]) != 0) + ((v & kAxisVoteMasks[2]) != 0);
         oneVote += axes == 1;
       }
     }
