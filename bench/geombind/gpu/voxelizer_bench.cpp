@@ -6,6 +6,12 @@
 // GPU before every readback, so rendering and readback separate) and a separate classifyVotes on a
 // fresh grid. The rerun is not counted in the benchmark's own time.
 //
+// BM_CpuAxisSweep times the CPU voxelizer (Cpu::voxelizeInterior, the same decision without OpenGL)
+// on the torus, counting where it disagrees with voxelizeInterior, and on the 50k-triangle test
+// character; its sweeps_s counter is an untimed rerun of the sweeps alone, the rest being classification.
+// Its CPU column is the process's CPU time over all threads: on a shared machine, that divided by the
+// thread count says more than the wall-clock time.
+//
 // BM_CpuRayParity marks a voxel inside when a ray from its centre along +x crosses the mesh an odd
 // number of times, and counts the voxels where that disagrees with voxelizeInterior.
 //
@@ -30,15 +36,19 @@
 
 #include "common/gl_context.h"
 #include "common/run_benchmarks.h"
+#include "geombind/cpu/axis_sweep_voxelizer.h"
 #include "geombind/gpu/slice_voxelizer.h"
 #include "geombind/mesh.h"
 #include "geombind/voxel_bit_grid.h"
 #include "gl/gl_api.h"
+#include "meshes/character.h"
 #include "meshes/mesh_builders.h"
 
 namespace {
 
+using TessikSDK::GeomBind::AxisVoteGrid;
 using TessikSDK::GeomBind::IProgress;
+using TessikSDK::GeomBind::kAxisVoteMasks;
 using TessikSDK::GeomBind::MeshData;
 using TessikSDK::GeomBind::VoxelBitGrid;
 using TessikSDK::GeomBind::Collision::AABB;
@@ -62,6 +72,25 @@ MeshData MakeMesh() {
 
 const MeshData& TheMesh() {
   static const MeshData mesh = MakeMesh();
+  return mesh;
+}
+
+// The test character (51k triangles) scaled uniformly into the unit cube.
+const MeshData& TheCharacter() {
+  static const MeshData mesh = [] {
+    tessik::meshes::TriMesh body = tessik::meshes::character(1.0).mesh;
+    std::array<float, 3> lo = body.positions[0], hi = lo;
+    for (const auto& p : body.positions)
+      for (int k = 0; k < 3; ++k) lo[k] = std::min(lo[k], p[k]), hi[k] = std::max(hi[k], p[k]);
+    const float scale = 1.0f / std::max({hi[0] - lo[0], hi[1] - lo[1], hi[2] - lo[2]});
+    MeshData m;
+    for (const auto& p : body.positions)
+      m.vertices.push_back(
+          {{0.0f, 0.0f, 0.0f}, {(p[0] - lo[0]) * scale, (p[1] - lo[1]) * scale, (p[2] - lo[2]) * scale}});
+    m.triangles = body.triangles;
+    m.boundingBox = AABB(glm::dvec3(-0.00001), glm::dvec3(1.00001));
+    return m;
+  }();
   return mesh;
 }
 
@@ -110,18 +139,18 @@ void BM_VoxelizeInterior(benchmark::State& state) {
     Gpu::voxelizeInterior(progress, mesh, grid, false, 0.0f);
 
     state.PauseTiming();
-    Gpu::AxisVoteGrid votes{dims, std::vector<std::uint8_t>(static_cast<std::size_t>(grid.cellCount()), 0)};
+    AxisVoteGrid votes{dims, std::vector<std::uint8_t>(static_cast<std::size_t>(grid.cellCount()), 0)};
     castFailed = !Gpu::castAxisVotes(mesh, votes, Gpu::builtinShaders(), &sweeps);
     if (!castFailed) {
       VoxelBitGrid fresh(n, n, n);
       std::vector<std::uint32_t> ambiguous;
       const auto start = std::chrono::steady_clock::now();
-      Gpu::classifyVotes(progress, votes, fresh, false, ambiguous);
+      TessikSDK::GeomBind::classifyVotes(progress, votes, fresh, false, ambiguous);
       classifySeconds += SecondsSince(start);
       oneVote = 0;
       for (std::uint8_t v : votes.votes) {
-        const int axes = ((v & Gpu::kAxisVoteMasks[0]) != 0) + ((v & Gpu::kAxisVoteMasks[1]) != 0) +
-                         ((v & Gpu::kAxisVoteMasks[2]) != 0);
+        const int axes =
+            ((v & kAxisVoteMasks[0]) != 0) + ((v & kAxisVoteMasks[1]) != 0) + ((v & kAxisVoteMasks[2]) != 0);
         oneVote += axes == 1;
       }
     }
@@ -141,6 +170,29 @@ void BM_VoxelizeInterior(benchmark::State& state) {
   state.counters["one_vote"] = static_cast<double>(oneVote);
   state.counters["triangles"] = static_cast<double>(mesh.triangles.size());
   GpuGrids()[n] = std::move(grid);
+}
+
+void BM_CpuAxisSweep(benchmark::State& state) {
+  const auto n = static_cast<std::uint32_t>(state.range(0));
+  const bool character = state.range(1) != 0;
+  const MeshData& mesh = character ? TheCharacter() : TheMesh();
+  TessikSDK::GeomBind::NullProgress progress;
+  VoxelBitGrid grid;
+  for (auto _ : state) {
+    state.PauseTiming();
+    grid = VoxelBitGrid(n, n, n);
+    state.ResumeTiming();
+    TessikSDK::GeomBind::Cpu::voxelizeInterior(progress, mesh, grid, false, 0.0f);
+  }
+  AxisVoteGrid votes{grid.dims, std::vector<std::uint8_t>(static_cast<std::size_t>(grid.cellCount()), 0)};
+  const auto start = std::chrono::steady_clock::now();
+  TessikSDK::GeomBind::Cpu::castAxisVotes(progress, mesh, votes);
+  state.counters["sweeps_s"] = SecondsSince(start);
+  state.counters["inside"] = static_cast<double>(CountSet(grid));
+  state.counters["triangles"] = static_cast<double>(mesh.triangles.size());
+  const auto found = GpuGrids().find(n);
+  if (!character && found != GpuGrids().end())
+    state.counters["disagree"] = static_cast<double>(CountDifferent(grid, found->second));
 }
 
 // Ray parity along +x. All voxels of one x row share the line their rays lie on, so the row's
@@ -282,6 +334,14 @@ void RegisterAll() {
         ->Iterations(s.gpuIterations)
         ->Unit(benchmark::kMillisecond)
         ->UseRealTime();
+    for (const int character : {0, 1})
+      benchmark::RegisterBenchmark("BM_CpuAxisSweep", BM_CpuAxisSweep)
+          ->Args({s.resolution, character})
+          ->ArgNames({"res", "character"})
+          ->Iterations(s.cpuIterations)
+          ->Unit(benchmark::kMillisecond)
+          ->MeasureProcessCPUTime()
+          ->UseRealTime();
     benchmark::RegisterBenchmark("BM_CpuRayParity", BM_CpuRayParity)
         ->Arg(s.resolution)
         ->ArgName("res")

@@ -10,6 +10,7 @@
 #include "geombind/gpu/gl_resources.h"
 #include "geombind/mesh.h"
 #include "geombind/voxel_bit_grid.h"
+#include "geombind/voxel_votes.h"
 
 namespace TessikSDK::GeomBind::Gpu {
 
@@ -24,16 +25,6 @@ void voxelizeInterior(IProgress& progress,
                       VoxelBitGrid& grid,
                       bool refineInterior,
                       float windingThreshold);
-
-/// Generalised winding number of the mesh at `p` (signed solid angle / 4 pi, single precision): 1
-/// inside a closed outward-wound mesh, 0 outside, 0 for an empty mesh.
-float windingNumber(const MeshData& mesh, const std::array<float, 3>& p);
-
-/// One byte per voxel: the flags of the six sweeps that found the voxel inside.
-struct AxisVoteGrid {
-  std::array<std::uint32_t, 3> dims{0, 0, 0};
-  std::vector<std::uint8_t> votes;
-};
 
 /// The GLSL of the two programs; builtinShaders() is what the library ships.
 struct ShaderSources {
@@ -59,9 +50,6 @@ bool castAxisVotes(const MeshData& mesh,
                    const ShaderSources& shaders = builtinShaders(),
                    SweepTimings* timings = nullptr);
 
-/// Sweep flags: X descending 1, ascending 2; Y 4 and 8; Z 16 and 32. An axis votes with either flag.
-constexpr std::uint8_t kAxisVoteMasks[3] = {3, 12, 48};
-
 /// Where texel (u, v) of slice s of one sweep lands: origin + u uDir + v vDir + s sliceDir, in u32
 /// arithmetic (a -1 component wraps and still adds correctly).
 struct SweepMapping {
@@ -79,21 +67,6 @@ struct AccumulatorBit {
   float bitValue;
 };
 AccumulatorBit accumulatorBit(std::uint32_t k);
-
-/// Sets the bit of every voxel without one whose votes come from two or three axes; with
-/// `refineInterior`, lists the voxels with exactly one vote in `ambiguous` (in no particular order).
-void classifyVotes(IProgress& progress,
-                   const AxisVoteGrid& votes,
-                   VoxelBitGrid& grid,
-                   bool refineInterior,
-                   std::vector<std::uint32_t>& ambiguous);
-
-/// Sets the bit of each listed voxel whose centre has a winding number above `threshold`.
-void refineByWindingNumber(IProgress& progress,
-                           const MeshData& mesh,
-                           const std::vector<std::uint32_t>& ambiguous,
-                           VoxelBitGrid& grid,
-                           float threshold);
 
 /// The mesh uploaded once for all sweeps, centred on the grid box.
 struct MeshBuffers {

@@ -13,97 +13,18 @@
 
 #include "meshes/mesh_builders.h"
 #include "support/gl_context_fixture.h"
+#include "support/voxel_shapes.h"
 
 namespace {
 
 using namespace TessikSDK::GeomBind;
-using Gpu::AxisVoteGrid;
 using tessik::meshes::TriMesh;
 using Vec3 = tessik::meshes::Vec3;
 
-// The prepared frame of the geodesic method: positions in the unit cube, the grid over a padded cube.
-MeshData unitFrameMesh(const TriMesh& m) {
-  MeshData mesh;
-  for (const auto& p : m.positions) mesh.vertices.push_back({{0, 0, 0}, p});
-  mesh.triangles = m.triangles;
-  mesh.boundingBox = Collision::AABB(glm::dvec3(-0.00001), glm::dvec3(1.00001));
-  return mesh;
-}
-
-class NoProgress : public IProgress {
- public:
-  void begin(const char*, int, int) override {}
-  void end() override {}
-  void setRange(int, int) override {}
-  bool update(int) override { return false; }
-  bool isCanceled() override { return canceled; }
-  bool canceled = false;
-};
-
-glm::dvec3 voxelSize(const MeshData& mesh, const std::array<std::uint32_t, 3>& dims) {
-  const glm::dvec3 e = mesh.boundingBox.upper - mesh.boundingBox.lower;
-  return {e.x / dims[0], e.y / dims[1], e.z / dims[2]};
-}
-
-// Signed distance of analytic shapes (negative inside): the reference for insideness.
-using Sdf = std::function<double(const glm::dvec3&)>;
-double boxSdf(const glm::dvec3& p, const glm::dvec3& lo, const glm::dvec3& hi) {
-  const glm::dvec3 c = (lo + hi) * 0.5, h = (hi - lo) * 0.5, q = glm::abs(p - c) - h;
-  return glm::length(glm::max(q, 0.0)) + std::min(std::max(q.x, std::max(q.y, q.z)), 0.0);
-}
-double torusSdf(glm::dvec3 p, const glm::dvec3& c, double R, double r, bool aroundY) {
-  p -= c;
-  if (aroundY) p = glm::dvec3(p.x, p.z, -p.y);
-  return std::hypot(std::hypot(p.x, p.y) - R, p.z) - r;
-}
-
-struct ShapeCase {
-  const char* name;
-  std::function<TriMesh()> build;
-  Sdf sdf;
-};
-
-void PrintTo(const ShapeCase& c, std::ostream* os) { *os << c.name; }
-
-const std::vector<ShapeCase>& shapes() {
-  static const std::vector<ShapeCase> cases = {
-      {"cube",
-       [] {
-         return tessik::meshes::box({0.2f, 0.25f, 0.3f}, {0.8f, 0.7f, 0.75f});
-       },
-       [](const glm::dvec3& p) {
-         return boxSdf(p, {0.2, 0.25, 0.3}, {0.8, 0.7, 0.75});
-       }},
-      {"sphere",
-       [] {
-         return tessik::meshes::sphere({0.5f, 0.5f, 0.5f}, 0.4f, 32, 64);
-       },
-       [](const glm::dvec3& p) { return glm::length(p - glm::dvec3(0.5)) - 0.4; }},
-      {"torus",
-       [] {
-         return tessik::meshes::torus({0.5f, 0.5f, 0.5f}, 0.3f, 0.12f, 96, 32);
-       },
-       [](const glm::dvec3& p) { return torusSdf(p, glm::dvec3(0.5), 0.3, 0.12, false); }},
-      {"interlocked_tori",
-       [] {
-         TriMesh m = tessik::meshes::torus({0.4f, 0.5f, 0.5f}, 0.22f, 0.07f, 96, 24);
-         m.append(tessik::meshes::torus({0.62f, 0.5f, 0.5f}, 0.22f, 0.07f, 96, 24, true));
-         return m;
-       },
-       [](const glm::dvec3& p) {
-         return std::min(torusSdf(p, {0.4, 0.5, 0.5}, 0.22, 0.07, false),
-                         torusSdf(p, {0.62, 0.5, 0.5}, 0.22, 0.07, true));
-       }},
-      {"concave_l",
-       [] {
-         return tessik::meshes::lShape({0.1f, 0.1f, 0.0f}, 0.4f, 0.2f, 0.8f);
-       },
-       [](const glm::dvec3& p) {
-         return std::min(boxSdf(p, {0.1, 0.1, 0.2}, {0.9, 0.5, 0.8}),
-                         boxSdf(p, {0.1, 0.1, 0.2}, {0.5, 0.9, 0.8}));
-       }}};
-  return cases;
-}
+using tessik::test::NoProgress;
+using tessik::test::ShapeCase;
+using tessik::test::unitFrameMesh;
+using tessik::test::voxelSize;
 
 class SliceVoxelizerGL : public tessik::test::GLContextTest {};
 
@@ -141,46 +62,20 @@ TEST_P(InteriorMatchesReference, DisagreesOnlyNextToTheSurface) {
 
 INSTANTIATE_TEST_SUITE_P(Gpu,
                          InteriorMatchesReference,
-                         ::testing::Combine(::testing::ValuesIn(shapes()), ::testing::Values(16u, 40u, 64u)),
+                         ::testing::Combine(::testing::ValuesIn(tessik::test::shapes()),
+                                            ::testing::Values(16u, 40u, 64u)),
                          [](const auto& info) {
                            return std::string(std::get<0>(info.param).name) + "_" +
                                   std::to_string(std::get<1>(info.param));
                          });
 
-// An off-centre box over a grid of unequal dimensions: every sweep's flag must sit exactly on the voxels
-// whose sampled face point lies in the box, so a mirrored or transposed mapping shows. Forty layers
-// along x also take each x sweep through a readback after 32 slices and a second one at the end.
+// Forty layers along x also take each x sweep through a readback after 32 slices and a second one at
+// the end.
 TEST_F(SliceVoxelizerGL, EverySweepFlagsTheVoxelsWhoseFacePointIsInside) {
-  const std::array<std::uint32_t, 3> dims = {40, 12, 18};
-  const MeshData probe = unitFrameMesh({});
-  const glm::dvec3 d = voxelSize(probe, dims);
-  // Box faces 0.37 and 0.63 of a voxel off the grid planes: no sample is borderline.
-  const glm::dvec3 lo = probe.boundingBox.lower + glm::dvec3(2.37, 3.63, 5.37) * d;
-  const glm::dvec3 hi = probe.boundingBox.lower + glm::dvec3(38.63, 9.37, 11.63) * d;
-  const MeshData mesh = unitFrameMesh(
-      tessik::meshes::box({float(lo.x), float(lo.y), float(lo.z)}, {float(hi.x), float(hi.y), float(hi.z)}));
-  AxisVoteGrid votes{dims, std::vector<std::uint8_t>(std::size_t{40} * 12 * 18, 0)};
-  ASSERT_TRUE(Gpu::castAxisVotes(mesh, votes));
-  std::size_t mismatches = 0;
-  for (std::uint32_t z = 0; z < dims[2]; ++z)
-    for (std::uint32_t y = 0; y < dims[1]; ++y)
-      for (std::uint32_t x = 0; x < dims[0]; ++x) {
-        const glm::dvec3 index(x, y, z);
-        for (int axis = 0; axis < 3; ++axis)
-          for (int ascending = 0; ascending < 2; ++ascending) {
-            glm::dvec3 at = index + 0.5;
-            at[axis] = index[axis] + ascending;  // descending samples the lower face, ascending the upper
-            const glm::dvec3 p = mesh.boundingBox.lower + at * d;
-            const bool inBox = glm::all(glm::greaterThan(p, lo)) && glm::all(glm::lessThan(p, hi));
-            const std::uint8_t flag = static_cast<std::uint8_t>(1u << (2 * axis + ascending));
-            const bool flagged = (votes.votes[(std::size_t{z} * dims[1] + y) * dims[0] + x] & flag) != 0;
-            if (flagged != inBox && ++mismatches < 5) {
-              ADD_FAILURE() << "voxel (" << x << ", " << y << ", " << z << ") flag " << int(flag) << " is "
-                            << flagged;
-            }
-          }
-      }
-  EXPECT_EQ(mismatches, 0u);
+  const tessik::test::SweepFlagProbe probe;
+  AxisVoteGrid votes{probe.dims, std::vector<std::uint8_t>(std::size_t{40} * 12 * 18, 0)};
+  ASSERT_TRUE(Gpu::castAxisVotes(probe.mesh, votes));
+  EXPECT_EQ(probe.mismatches(votes), 0u);
 }
 
 TEST(SliceVoxelizerPacking, SliceThirteenIsBitFiveOfGreen) {
@@ -217,7 +112,7 @@ TEST_F(SliceVoxelizerGL, OneVoteVoxelsFollowTheWindingNumber) {
       continue;
     }
     const glm::dvec3 c = mesh.boundingBox.lower + (glm::dvec3(i % n, i / n % n, i / (n * n)) + 0.5) * d;
-    const bool inside = Gpu::windingNumber(mesh, {float(c.x), float(c.y), float(c.z)}) > 0.2f;
+    const bool inside = windingNumber(mesh, {float(c.x), float(c.y), float(c.z)}) > 0.2f;
     EXPECT_EQ(refined.test(i), inside) << i;
     (inside ? settledIn : settledOut) += 1;
   }
@@ -282,7 +177,7 @@ TEST(SliceVoxelizerVotes, TwoAxesDecideAndSetBitsAreNeverAmbiguous) {
   grid.set(5);  // set by the boundary pass, one vote: stays set, never listed
   NoProgress progress;
   std::vector<std::uint32_t> ambiguous;
-  Gpu::classifyVotes(progress, votes, grid, true, ambiguous);
+  classifyVotes(progress, votes, grid, true, ambiguous);
   EXPECT_EQ(grid.bits[0], (1u << 2) | (1u << 4) | (1u << 5));
   std::sort(ambiguous.begin(), ambiguous.end());
   EXPECT_EQ(ambiguous, (std::vector<std::uint32_t>{1, 3}));
@@ -290,21 +185,21 @@ TEST(SliceVoxelizerVotes, TwoAxesDecideAndSetBitsAreNeverAmbiguous) {
   VoxelBitGrid untouched(6, 1, 1);
   ambiguous.clear();
   progress.canceled = true;
-  Gpu::classifyVotes(progress, votes, untouched, true, ambiguous);
+  classifyVotes(progress, votes, untouched, true, ambiguous);
   EXPECT_EQ(untouched.bits[0], 0u);
   EXPECT_TRUE(ambiguous.empty());
 }
 
 TEST(SliceVoxelizerWinding, OneInsideZeroOutsideAHalfOnTheOpenSide) {
   const MeshData sphere = unitFrameMesh(tessik::meshes::sphere({0.5f, 0.5f, 0.5f}, 0.4f, 16, 32));
-  EXPECT_NEAR(Gpu::windingNumber(sphere, {0.5f, 0.55f, 0.45f}), 1.0f, 1e-3f);
-  EXPECT_NEAR(Gpu::windingNumber(sphere, {0.95f, 0.5f, 0.5f}), 0.0f, 1e-3f);
-  EXPECT_EQ(Gpu::windingNumber(MeshData(), {0.5f, 0.5f, 0.5f}), 0.0f);
+  EXPECT_NEAR(windingNumber(sphere, {0.5f, 0.55f, 0.45f}), 1.0f, 1e-3f);
+  EXPECT_NEAR(windingNumber(sphere, {0.95f, 0.5f, 0.5f}), 0.0f, 1e-3f);
+  EXPECT_EQ(windingNumber(MeshData(), {0.5f, 0.5f, 0.5f}), 0.0f);
   // A single square seen from just in front of its middle covers almost half the sphere of directions.
   TriMesh square;
   for (auto p : {Vec3{0, 0, 0}, Vec3{1, 0, 0}, Vec3{1, 1, 0}, Vec3{0, 1, 0}}) square.add(p[0], p[1], p[2]);
   tessik::meshes::quad(square, 0, 1, 2, 3);
-  EXPECT_NEAR(Gpu::windingNumber(unitFrameMesh(square), {0.5f, 0.5f, -0.001f}), 0.5f, 0.01f);
+  EXPECT_NEAR(windingNumber(unitFrameMesh(square), {0.5f, 0.5f, -0.001f}), 0.5f, 0.01f);
 }
 
 }  // namespace
