@@ -104,18 +104,26 @@ class TESSIK_API ITransformHierarchy {
   virtual ~ITransformHierarchy();
 };
 
-/// A binding context. Create it on a thread whose current OpenGL context offers version 2.1 or later.
+/// A binding context. Made by `create` on a thread whose current OpenGL context offers version 2.1 or
+/// later, or by `createWithoutOpenGL` anywhere.
 class TESSIK_API IContext {
  public:
   /// Null when no OpenGL context is current on this thread or it lacks OpenGL 2.1.
   static IContext* create();
+  /// A context that issues no OpenGL call and needs neither a GL context nor a GL library: the geodesic
+  /// method voxelises the mesh's inside on the processor, deciding what the GPU sweeps decide (the two
+  /// may differ only on voxels within half a voxel of the surface), in parallel and with the same result
+  /// for any thread count. The heat-diffusion method is the same in both kinds of context. Released by
+  /// `dispose` like any other.
+  static IContext* createWithoutOpenGL();
   /// Null is ignored. Releases the context's result too.
   static void dispose(IContext* context);
 
   /// Takes no action.
   virtual void reserved() = 0;
 
-  /// Geodesic sparse-voxel binding. Needs the OpenGL context current on this thread. `falloff` is
+  /// Geodesic sparse-voxel binding. A context from `create` needs its OpenGL context current on this
+  /// thread; one from `createWithoutOpenGL` needs none. `falloff` is
   /// clamped to [0, 1] (0 soft, 1 sharp); `influenceLimit` 0 keeps every influence; `resolution` is
   /// the voxel count along the longest side. Mesh and hierarchy are rewritten in place (unit frame,
   /// joints as pure translations). Returns the context's result, never null; empty on failure.
@@ -127,8 +135,8 @@ class TESSIK_API IContext {
                                                         int resolution,
                                                         bool refineInterior) = 0;
 
-  /// Heat-diffusion binding. Issues no OpenGL calls itself (the context still had to be created with a GL
-  /// context current). Arguments and result as bindGeodesicSparseVoxel, without the voxel options.
+  /// Heat-diffusion binding. Issues no OpenGL calls (a context from `create` still had to be created with
+  /// a GL context current). Arguments and result as bindGeodesicSparseVoxel, without the voxel options.
   virtual ISparseVertexWeights* bindHeatmap(IMesh* mesh,
                                             ITransformHierarchy* hierarchy,
                                             IProgress* progress,

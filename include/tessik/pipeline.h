@@ -22,8 +22,9 @@
 /// weights of their nearest neighbour or joint, folds the tips back into their leaves, and limits and
 /// normalises the influences. The answer is indexed by the caller's own vertices and bones.
 ///
-/// Both methods need an OpenGL 2.1 context current on the calling thread (the binding context is made
-/// there); the pipeline makes none itself.
+/// No method needs OpenGL unless asked to: the heat method never uses it, and the geodesic method
+/// voxelises the mesh's inside on the processor unless Options::voxelizer picks the GPU. The GPU path
+/// uses the OpenGL 2.1 context current on the calling thread; the pipeline makes none itself.
 namespace TessikSDK::Pipeline {
 
 /// Row by row, applied to column vectors (p' = M p): translation in elements 3, 7 and 11.
@@ -44,6 +45,13 @@ struct Mesh {
 
 enum class Method { geodesic, heatmap };
 
+/// Where the geodesic method voxelises the inside of the mesh. `automatic` takes the GPU when a
+/// hardware-accelerated OpenGL 2.1 context is current on the calling thread, and the processor when
+/// there is none or it renders in software (where the processor is far faster); it loads no GL library
+/// the process does not already have. `gpu` needs such a context (any renderer). Both decide the same
+/// voxels but for ties within half a voxel of the surface.
+enum class Voxelizer { automatic, gpu, cpu };
+
 /// The accepted ranges, shared by every front end.
 struct Limits {
   static constexpr int minResolution = 8;
@@ -53,10 +61,11 @@ struct Limits {
 
 struct Options {
   Method method = Method::geodesic;
-  int resolution = 64;          ///< voxels along the longest side (geodesic)
-  float falloff = 0.5f;         ///< 0 soft to 1 sharp
-  unsigned maxInfluences = 4;   ///< 0 keeps every influence
-  bool refineInterior = false;  ///< geodesic: voxelise the inside at full resolution too
+  int resolution = 64;                         ///< voxels along the longest side (geodesic)
+  float falloff = 0.5f;                        ///< 0 soft to 1 sharp
+  unsigned maxInfluences = 4;                  ///< 0 keeps every influence
+  bool refineInterior = false;                 ///< geodesic: voxelise the inside at full resolution too
+  Voxelizer voxelizer = Voxelizer::automatic;  ///< geodesic: where the inside is voxelised
   /// Give every leaf bone a virtual end so that it can own the part it carries, rather than tie with
   /// its parent at its joint. The tip is the skeleton's own (Bone::hasTip) where it has one, otherwise
   /// cast from the leaf joint away from its parent to just inside the surface. Tips never appear in
@@ -93,6 +102,7 @@ struct Report {
   std::size_t pieces = 0;
   std::size_t turnedPieces = 0;   ///< wound inside out, turned for binding
   bool boundByPiece = false;      ///< the whole surface failed, so its pieces were bound in groups
+  bool interiorOnGpu = false;     ///< the geodesic method voxelised the inside on the GPU
   std::size_t unboundPieces = 0;  ///< pieces no group binding reached
   /// Of those, the ones with bones inside them, given wholly to those bones; the rest took the weights
   /// of the nearest bound vertex.
@@ -126,7 +136,7 @@ class TESSIK_API BindError : public std::runtime_error {
  public:
   enum class Kind {
     invalidInput,  ///< the mesh, bones or options are unusable; the message says which and why
-    noOpenGL,      ///< no OpenGL 2.1 context is current on the calling thread
+    noOpenGL,      ///< the GPU voxelizer was asked for, and no OpenGL 2.1 context is current
     noWeights,     ///< the method reached no bone from any piece of the surface
     cancelled,     ///< the progress object asked to stop
   };

@@ -71,6 +71,8 @@ IContext* IContext::create() {
   return context.release();
 }
 
+IContext* IContext::createWithoutOpenGL() { return new ContextImpl(Algorithm::InteriorVoxelizer::cpu); }
+
 void IContext::dispose(IContext* context) { delete context; }
 
 ContextImpl::~ContextImpl() = default;
@@ -98,6 +100,7 @@ ISparseVertexWeights* ContextImpl::bindGeodesicSparseVoxel(IMesh* mesh,
   options.highFalloffExponent = 30.0f;
   options.boundaryCostFactor = 4.0f;
   options.smoothingIterations = Algorithm::smoothingIterationsFor(resolution);
+  options.voxelizer = voxelizer;
 
   Algorithm::GeodesicSparseVoxelBind strategy;
   result.perVertex = runStrategy(strategy, inputs, options, progress);

@@ -2,6 +2,7 @@
 
 #include "tessik/geombind.h"
 
+#include "geombind/algorithm/geodesic/voxel_grid.h"
 #include "geombind/sparse_vertex_weights.h"
 
 namespace TessikSDK::GeomBind {
@@ -12,6 +13,8 @@ float clampFalloff(float falloff);
 
 class ContextImpl : public IContext {
  public:
+  explicit ContextImpl(Algorithm::InteriorVoxelizer voxelizer = Algorithm::InteriorVoxelizer::gpu)
+      : voxelizer(voxelizer) {}
   ~ContextImpl() override;
 
   void reserved() override;
@@ -29,6 +32,8 @@ class ContextImpl : public IContext {
                                     unsigned int influenceLimit) override;
 
   SparseVertexWeightsImpl result;
+  /// gpu for contexts made by create, cpu for those made by createWithoutOpenGL.
+  Algorithm::InteriorVoxelizer voxelizer;
 };
 
 }  // namespace TessikSDK::GeomBind

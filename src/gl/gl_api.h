@@ -36,6 +36,14 @@ bool load(std::string* why = nullptr);
 /// Whether the context current on this thread reports at least this version; false without one.
 bool versionAtLeast(int major, int minor);
 
+/// Whether the process already has a GL library loaded (the host's, or ours from an earlier load): only
+/// then can a context be current. Loads nothing.
+bool libraryInProcess();
+
+/// Whether the context current on this thread renders in software (Mesa's llvmpipe, softpipe or swrast);
+/// false without a context.
+bool softwareRenderer();
+
 /// Whether the current context lists the extension (whole name, e.g. "GL_ARB_framebuffer_object").
 bool hasExtension(const char* name);
 

@@ -77,6 +77,25 @@ bool load(std::string* why) {
   return loaded().ok;
 }
 
+bool libraryInProcess() {
+  for (const char* name : {"libOpenGL.so.0", "libGL.so.1"}) {
+    if (void* handle = dlopen(name, RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD)) {
+      dlclose(handle);  // drops only the reference RTLD_NOLOAD took
+      return true;
+    }
+  }
+  return false;
+}
+
+bool softwareRenderer() {
+  if (api().GetString == nullptr) return false;
+  const auto* renderer = reinterpret_cast<const char*>(api().GetString(GL_RENDERER));
+  if (renderer == nullptr) return false;
+  for (const char* software : {"llvmpipe", "softpipe", "swrast"})
+    if (std::strstr(renderer, software) != nullptr) return true;
+  return false;
+}
+
 bool versionAtLeast(int major, int minor) {
   if (api().GetString == nullptr) return false;
   const auto* version = reinterpret_cast<const char*>(api().GetString(GL_VERSION));

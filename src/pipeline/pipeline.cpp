@@ -9,6 +9,7 @@
 #include <string>
 #include <utility>
 
+#include "gl/gl_api.h"
 #include "pipeline/enclosed_bones.h"
 #include "pipeline/influences.h"
 #include "pipeline/input_check.h"
@@ -21,6 +22,14 @@ namespace {
 
 namespace gb = TessikSDK::GeomBind;
 using Clock = std::chrono::steady_clock;
+
+// Only the geodesic method voxelises. Automatic asks whether the caller's thread has a hardware context
+// without loading a GL library the process lacks: without one no context can be current.
+bool interiorOnGpu(const Options& options) {
+  if (options.method != Method::geodesic || options.voxelizer == Voxelizer::cpu) return false;
+  if (options.voxelizer == Voxelizer::gpu) return true;
+  return GL::libraryInProcess() && GL::load() && GL::versionAtLeast(2, 1) && !GL::softwareRenderer();
+}
 
 template <typename T>
 struct Disposer {
@@ -259,11 +268,12 @@ Result bindSkin(const Mesh& mesh,
   // The method's own cut would count a leaf and its tip apart; with tips the cut comes after folding.
   const unsigned methodLimit = tips.tips.empty() ? options.maxInfluences : 0u;
 
-  const Owned<gb::IContext> context(gb::IContext::create());
+  report.interiorOnGpu = interiorOnGpu(options);
+  const Owned<gb::IContext> context(report.interiorOnGpu ? gb::IContext::create()
+                                                         : gb::IContext::createWithoutOpenGL());
   if (!context)
     throw BindError(BindError::Kind::noOpenGL,
-                    "no OpenGL 2.1 context is current on this thread, and the binding context needs one for "
-                    "either method");
+                    "the GPU voxelizer was asked for, and no OpenGL 2.1 context is current on this thread");
   std::vector<bool> unboundPiece;
   Weights nodeWeights = bindOnce(*context, welded.mesh, nodes, options, methodLimit, clock);
   cancelled();

@@ -103,7 +103,8 @@ VertexWeights GeodesicSparseVoxelBind::bind(const MeshData& mesh,
   std::vector<VoxelGrid> levels;
   stage("Compute Voxel Grids and all LODs", [&] {
     if (!progress.isCanceled())
-      levels = buildGridsAndLevels(progress, mesh, options->resolution, options->refineInterior);
+      levels = buildGridsAndLevels(progress, mesh, options->resolution, options->refineInterior,
+                                   options->voxelizer);
   });
 
   progress.begin("Extracting sparse voxels ... ", 50, 0);

@@ -3,6 +3,7 @@
 #include <cstdint>
 
 #include "geombind/algorithm/bind_strategy.h"
+#include "geombind/algorithm/geodesic/voxel_grid.h"
 #include "geombind/collision/octree.h"
 
 namespace TessikSDK::GeomBind::Algorithm {
@@ -23,6 +24,7 @@ struct GeodesicSparseVoxelOptions : IBindOptions {
   float highFalloffExponent = 30.0f;
   float boundaryCostFactor = 4.0f;
   std::int32_t smoothingIterations = 4;
+  InteriorVoxelizer voxelizer = InteriorVoxelizer::gpu;
 };
 
 /// Stage "Compute Octree": the mesh triangles and the bone elements (segments parent to child, points at
@@ -36,9 +38,10 @@ void computeOctree(IProgress& progress,
 /// Weight exponent for a falloff in [0, 1], in single precision: 5 at 0, 17.5 at 0.5, 30 at 1.
 double weightExponent(const GeodesicSparseVoxelOptions& options);
 
-/// Geodesic sparse-voxel binding: the mesh volume is voxelised (surface on the CPU, interior on the GPU
-/// through the current OpenGL context), distances from every bone run through the voxels, and weights
-/// fall off with a power of them, smoothed over the mesh and truncated to `influenceLimit`.
+/// Geodesic sparse-voxel binding: the mesh volume is voxelised (surface on the CPU, interior as
+/// `voxelizer` says: on the GPU through the current OpenGL context, or on the CPU), distances from every bone
+/// run through the voxels, and weights fall off with a power of them, smoothed over the mesh and truncated to
+/// `influenceLimit`.
 ///
 /// Result: one list per vertex. Lists of `influenceLimit` or fewer bones (or every list when the limit
 /// is below 1) hold every bone in bone order; longer ones are cut to the strongest, sorted by weight,

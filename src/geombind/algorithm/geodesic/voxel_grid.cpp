@@ -3,6 +3,7 @@
 #include "diagnostics/stage_profiler.h"
 #include "geombind/algorithm/geodesic/geodesic_sparse_voxel_bind.h"
 #include "geombind/collision/intersection.h"
+#include "geombind/cpu/axis_sweep_voxelizer.h"
 #include "geombind/gpu/slice_voxelizer.h"
 #include "geombind/parallel.h"
 
@@ -106,7 +107,8 @@ VoxelGrid buildCoarserLevel(const VoxelGrid& finer, const Collision::AABB& box) 
 std::vector<VoxelGrid> buildGridsAndLevels(IProgress& progress,
                                            const MeshData& mesh,
                                            std::int32_t resolution,
-                                           bool refineInterior) {
+                                           bool refineInterior,
+                                           InteriorVoxelizer voxelizer) {
   Diagnostics::StageProfiler& profiler = Diagnostics::stageProfiler();
   std::vector<VoxelGrid> levels(static_cast<std::size_t>(ceilLog2(resolution)) + 1);
   const auto n = static_cast<std::uint32_t>(std::max(resolution, 0));
@@ -122,7 +124,13 @@ std::vector<VoxelGrid> buildGridsAndLevels(IProgress& progress,
   progress.update(1);
 
   timer = profiler.startTimer("    Voxelizing internal volume");
-  if (!progress.isCanceled()) Gpu::voxelizeInterior(progress, mesh, bits, refineInterior, 0.2f);
+  if (!progress.isCanceled()) {
+    if (voxelizer == InteriorVoxelizer::cpu) {
+      Cpu::voxelizeInterior(progress, mesh, bits, refineInterior, 0.2f);
+    } else {
+      Gpu::voxelizeInterior(progress, mesh, bits, refineInterior, 0.2f);
+    }
+  }
   stampLabel(finest, bits, Interior);
   profiler.stopTimer(static_cast<std::uint32_t>(timer));
   progress.update(2);

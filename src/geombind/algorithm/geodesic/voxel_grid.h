@@ -39,12 +39,17 @@ void stampLabel(VoxelGrid& level, const VoxelBitGrid& bits, VoxelLabel label);
 /// eight child centres is not Empty.
 VoxelGrid buildCoarserLevel(const VoxelGrid& finer, const Collision::AABB& box);
 
+/// Where the inside of the mesh is voxelised: by the GPU sweeps through the current OpenGL context, or by
+/// the same sweeps on the processor.
+enum class InteriorVoxelizer { gpu, cpu };
+
 /// Stage "Compute Voxel Grids and all LODs": the finest level resolution^3 labelled Boundary, Interior
-/// or Empty (surface on the CPU, interior on the GPU), then ceilLog2(resolution) coarser levels. Index 0
-/// is the coarsest; a level's index is the octree depth it serves.
+/// or Empty (surface on the CPU, interior by `voxelizer`), then ceilLog2(resolution) coarser levels.
+/// Index 0 is the coarsest; a level's index is the octree depth it serves.
 std::vector<VoxelGrid> buildGridsAndLevels(IProgress& progress,
                                            const MeshData& mesh,
                                            std::int32_t resolution,
-                                           bool refineInterior);
+                                           bool refineInterior,
+                                           InteriorVoxelizer voxelizer = InteriorVoxelizer::gpu);
 
 }  // namespace TessikSDK::GeomBind::Algorithm
