@@ -27,7 +27,7 @@ void computeOctree(IProgress& progress,
                    const HierarchyData& hierarchy,
                    std::int32_t resolution,
                    Collision::Octree& octree) {
-  octree.reset(mesh.boundingBox);
+  octree.reset(octreeBox(mesh.boundingBox, resolution));
   const int triangleCount = static_cast<int>(mesh.triangles.size());
   progress.begin("Computing Octree ... ", triangleCount, 0);
   for (const TriangleRecord& t : mesh.triangles) {

@@ -28,7 +28,8 @@ struct GeodesicSparseVoxelOptions : IBindOptions {
 };
 
 /// Stage "Compute Octree": the mesh triangles and the bone elements (segments parent to child, points at
-/// joints without children) split down to depth ceilLog2(resolution). Left unbuilt when cancelled.
+/// joints without children) split down to depth ceilLog2(resolution) over octreeBox(), so that its
+/// finest octants are the cells of the finest grid. Left unbuilt when cancelled.
 void computeOctree(IProgress& progress,
                    const MeshData& mesh,
                    const HierarchyData& hierarchy,

@@ -1,5 +1,7 @@
 #include "geombind/algorithm/geodesic/sparse_voxels.h"
 
+#include <cmath>
+
 #include "geombind/collision/intersection.h"
 #include "geombind/parallel.h"
 
@@ -28,9 +30,11 @@ void VoxelExtractor::visitLeaf(const Collision::Octant& octant) {
   const VoxelGrid& level = levels[octant.depth];
   // A level with a zero dimension has no cells to look in.
   if (level.cells.empty()) return;
+  // Level d holds the octants of depth d, so the leaf's centre lies well inside its own cell and only
+  // ever falls past the stored cells for leaves wholly in the padding beyond the mesh box.
   const glm::dvec3 centre = (octant.bounds.lower + octant.bounds.upper) * 0.5;
-  const std::uint8_t label =
-      level.cells[static_cast<std::size_t>(cellIndexOf(centre, rootBounds, level.dims))];
+  const glm::dvec3 size = (rootBounds.upper - rootBounds.lower) / std::ldexp(1.0, octant.depth);
+  const std::uint8_t label = labelAt(level, rootBounds.lower, size, centre);
   if (label == Empty) return;
   auto voxel = std::make_unique<SparseVoxel>();
   voxel->label = label;
@@ -75,10 +79,8 @@ void extractSparseVoxels(const Collision::Octree& octree,
   octree.accept(extractor);
   for (const auto& voxel : voxels) voxelMap[voxel->octant] = voxel.get();
 
-  const VoxelGrid& finest = levels.back();
   const glm::dvec3 extent = octree.bounds.upper - octree.bounds.lower;
-  const glm::dvec3 half(extent.x / finest.dims[0] * 0.5, extent.y / finest.dims[1] * 0.5,
-                        extent.z / finest.dims[2] * 0.5);
+  const glm::dvec3 half = extent / std::ldexp(1.0, static_cast<int>(levels.size() - 1)) * 0.5;
   const std::int64_t count = static_cast<std::int64_t>(voxels.size());
 #pragma omp parallel for schedule(static) num_threads(processorThreads())
   for (std::int64_t i = 0; i < count; ++i) {

@@ -40,7 +40,8 @@ class OctreeLeafTraverser : public Collision::IOctreeConstVisitor {
   virtual void visitLeaf(const Collision::Octant& octant) = 0;
 };
 
-/// Collects a sparse voxel for every leaf whose cell in the level of the leaf's depth is not Empty.
+/// Collects a sparse voxel for every leaf whose cell in the level of the leaf's depth is not Empty; level
+/// d is taken as 2^d cells per axis over `rootBounds`.
 class VoxelExtractor : public OctreeLeafTraverser {
  public:
   VoxelExtractor(const Collision::AABB& rootBounds,

@@ -1,5 +1,8 @@
 #include "geombind/algorithm/geodesic/voxel_grid.h"
 
+#include <algorithm>
+#include <cmath>
+
 #include "diagnostics/stage_profiler.h"
 #include "geombind/algorithm/geodesic/geodesic_sparse_voxel_bind.h"
 #include "geombind/collision/intersection.h"
@@ -27,14 +30,27 @@ std::uint32_t cellOf(double coordinate, double lower, double size, std::uint32_t
   return cell < dim ? cell : dim - 1;
 }
 
-std::uint64_t cellIndexOf(const glm::dvec3& p,
-                          const Collision::AABB& box,
-                          const std::array<std::uint32_t, 3>& dims) {
-  const glm::dvec3 size = cellSize(box, dims);
-  const std::uint32_t x = cellOf(p.x, box.lower.x, size.x, dims[0]);
-  const std::uint32_t y = cellOf(p.y, box.lower.y, size.y, dims[1]);
-  const std::uint32_t z = cellOf(p.z, box.lower.z, size.z, dims[2]);
-  return (std::uint64_t{z} * dims[1] + y) * dims[0] + x;
+Collision::AABB octreeBox(const Collision::AABB& meshBox, std::int32_t resolution) {
+  if (resolution <= 1) return meshBox;
+  // For a power of two this adds exactly zero, so those resolutions keep the mesh box bit for bit.
+  const double padCells = std::ldexp(1.0, ceilLog2(resolution)) - resolution;
+  const glm::dvec3 size = (meshBox.upper - meshBox.lower) / static_cast<double>(resolution);
+  return Collision::AABB(meshBox.lower, meshBox.upper + padCells * size);
+}
+
+std::uint8_t labelAt(const VoxelGrid& level,
+                     const glm::dvec3& lower,
+                     const glm::dvec3& size,
+                     const glm::dvec3& p) {
+  std::uint32_t cell[3];
+  for (int k = 0; k < 3; ++k) {
+    const double at = (p[k] - lower[k]) / size[k];
+    // Written so that NaN also lands outside.
+    if (!(at >= 0.0 && at < static_cast<double>(level.dims[k]))) return Empty;
+    cell[k] = static_cast<std::uint32_t>(at);
+  }
+  return level.cells[static_cast<std::size_t>(
+      (std::uint64_t{cell[2]} * level.dims[1] + cell[1]) * level.dims[0] + cell[0])];
 }
 
 void voxelizeBoundary(IProgress& progress, const MeshData& mesh, VoxelBitGrid& grid) {
@@ -77,29 +93,26 @@ void stampLabel(VoxelGrid& level, const VoxelBitGrid& bits, VoxelLabel label) {
   }
 }
 
-VoxelGrid buildCoarserLevel(const VoxelGrid& finer, const Collision::AABB& box) {
+VoxelGrid buildCoarserLevel(const VoxelGrid& finer) {
   VoxelGrid coarse;
-  coarse.dims = {finer.dims[0] / 2, finer.dims[1] / 2, finer.dims[2] / 2};
+  const std::array<std::uint32_t, 3>& f = finer.dims;
+  coarse.dims = {f[0] / 2 + f[0] % 2, f[1] / 2 + f[1] % 2, f[2] / 2 + f[2] % 2};
   coarse.cells.assign(static_cast<std::size_t>(cellCount(coarse.dims)), Empty);
-  const glm::dvec3 half = cellSize(box, finer.dims) * 0.5;
-  const glm::dvec3 size = cellSize(box, coarse.dims);
   const std::uint32_t nx = coarse.dims[0], ny = coarse.dims[1];
   const std::int64_t count = static_cast<std::int64_t>(coarse.cells.size());
 #pragma omp parallel for schedule(static) num_threads(processorThreads())
   for (std::int64_t i = 0; i < count; ++i) {
     const auto index = static_cast<std::uint64_t>(i);
-    const glm::dvec3 cell(static_cast<double>(index % nx), static_cast<double>(index / nx % ny),
-                          static_cast<double>(index / (std::uint64_t{nx} * ny)));
-    const glm::dvec3 centre = box.lower + (cell + 0.5) * size;
-    for (int sample = 0; sample < 8; ++sample) {
-      const glm::dvec3 at =
-          centre + glm::dvec3((sample & 1) ? half.x : -half.x, (sample & 2) ? half.y : -half.y,
-                              (sample & 4) ? half.z : -half.z);
-      if (finer.cells[static_cast<std::size_t>(cellIndexOf(at, box, finer.dims))] != Empty) {
-        coarse.cells[static_cast<std::size_t>(i)] = Interior;
-        break;
-      }
-    }
+    const std::uint32_t x = static_cast<std::uint32_t>(index % nx) * 2;
+    const std::uint32_t y = static_cast<std::uint32_t>(index / nx % ny) * 2;
+    const std::uint32_t z = static_cast<std::uint32_t>(index / (std::uint64_t{nx} * ny)) * 2;
+    bool occupied = false;
+    for (std::uint32_t cz = z; cz < std::min(z + 2, f[2]) && !occupied; ++cz)
+      for (std::uint32_t cy = y; cy < std::min(y + 2, f[1]) && !occupied; ++cy)
+        for (std::uint32_t cx = x; cx < std::min(x + 2, f[0]) && !occupied; ++cx)
+          occupied =
+              finer.cells[static_cast<std::size_t>((std::uint64_t{cz} * f[1] + cy) * f[0] + cx)] != Empty;
+    if (occupied) coarse.cells[static_cast<std::size_t>(i)] = Interior;
   }
   return coarse;
 }
@@ -137,8 +150,7 @@ std::vector<VoxelGrid> buildGridsAndLevels(IProgress& progress,
 
   timer = profiler.startTimer("    Computing LODs");
   if (!progress.isCanceled() && levels.size() >= 2) {
-    for (std::size_t i = levels.size() - 1; i-- > 0;)
-      levels[i] = buildCoarserLevel(levels[i + 1], mesh.boundingBox);
+    for (std::size_t i = levels.size() - 1; i-- > 0;) levels[i] = buildCoarserLevel(levels[i + 1]);
   }
   profiler.stopTimer(static_cast<std::uint32_t>(timer));
   progress.update(3);

@@ -44,19 +44,59 @@ struct UniformVoxels {
   VoxelMap voxelMap;
 };
 
-TEST(GeodesicLevels, HalvingResolution100) {
-  VoxelGrid level{{100, 100, 100}, std::vector<std::uint8_t>(1000000, Boundary)};
-  std::vector<std::uint32_t> xs = {100};
-  while (!level.cells.empty()) {
-    level = buildCoarserLevel(level, AABB(glm::dvec3(0), glm::dvec3(1)));
-    xs.push_back(level.dims[0]);
-    EXPECT_EQ(std::count(level.cells.begin(), level.cells.end(), Interior),
-              std::ptrdiff_t(level.cells.size()))
-        << "coarse cells over non-empty ones are Interior, never Boundary";
+// A few finest cells of an N^3 grid over the unit box marked Boundary, each with a point element placed
+// just inside its lower corner, where a leaf that only roughly matched the cell would take its label from
+// a neighbour.
+class GeodesicLevels : public ::testing::TestWithParam<int> {};
+
+TEST_P(GeodesicLevels, OctantsOfEveryDepthAreTheCellsOfTheirLevel) {
+  const auto n = static_cast<std::uint32_t>(GetParam());
+  const auto depth = static_cast<std::uint32_t>(ceilLog2(GetParam()));
+  const AABB box(glm::dvec3(0), glm::dvec3(1));
+  const std::uint32_t marked[][3] = {{0, 0, 0}, {n / 2 + 1, n - 1, 1}, {n - 1, n - 1, n - 1}};
+  std::vector<VoxelGrid> levels(depth + 1);
+  levels[depth] = {{n, n, n}, std::vector<std::uint8_t>(std::size_t{n} * n * n, Empty)};
+  Collision::Octree octree;
+  octree.reset(octreeBox(box, GetParam()));
+  for (const auto& c : marked) {
+    levels[depth].cells[(std::size_t{c[2]} * n + c[1]) * n + c[0]] = Boundary;
+    octree.add((glm::dvec3(c[0], c[1], c[2]) + 0.05) / double(n));
   }
-  EXPECT_EQ(xs, (std::vector<std::uint32_t>{100, 50, 25, 12, 6, 3, 1, 0}));
-  EXPECT_EQ(ceilLog2(100) + 1, 8);
+  for (std::uint32_t d = depth; d-- > 0;) levels[d] = buildCoarserLevel(levels[d + 1]);
+  for (std::uint32_t d = 0; d <= depth; ++d) {
+    const std::uint32_t side = (n + (1u << (depth - d)) - 1) >> (depth - d);
+    ASSERT_EQ(levels[d].dims, (std::array<std::uint32_t, 3>{side, side, side})) << "level " << d;
+    if (d == depth) continue;
+    std::vector<std::uint8_t> expected(levels[d].cells.size(), Empty);
+    for (const auto& c : marked) {
+      const std::uint32_t x = c[0] >> (depth - d), y = c[1] >> (depth - d), z = c[2] >> (depth - d);
+      expected[(std::size_t{z} * side + y) * side + x] = Interior;
+    }
+    EXPECT_EQ(levels[d].cells, expected) << "level " << d;
+  }
+
+  octree.build(0, depth);
+  SparseVoxelList voxels;
+  VoxelMap voxelMap;
+  extractSparseVoxels(octree, levels, voxels, voxelMap);
+  EXPECT_EQ(voxels.size(), 3u) << "only the marked cells' leaves; the padding past the mesh box is Empty";
+  for (const auto& element : octree.allElements()) {
+    const VoxelSet found = voxelsTouching(octree, voxelMap, *element->as<glm::dvec3>());
+    ASSERT_EQ(found.size(), 1u) << "a point in a marked cell lies in a voxel";
+    const Collision::Octant& leaf = *(*found.begin())->octant;
+    EXPECT_EQ(leaf.depth, depth);
+    EXPECT_NEAR(leaf.bounds.upper.x - leaf.bounds.lower.x, 1.0 / n, 1e-12)
+        << "finest octants are finest cells";
+  }
+  if ((n & (n - 1)) == 0) {
+    const AABB mesh(glm::dvec3(-0.00001), glm::dvec3(1.00001));
+    const AABB root = octreeBox(mesh, GetParam());
+    EXPECT_TRUE(root.lower == mesh.lower && root.upper == mesh.upper)
+        << "powers of two keep the mesh box exactly";
+  }
 }
+
+INSTANTIATE_TEST_SUITE_P(Geodesic, GeodesicLevels, ::testing::Values(64, 100, 127, 48));
 
 TEST(GeodesicNeighbours, DifferentSizesSharingOnlyACornerAreNeighbours) {
   Collision::Octree octree;
