@@ -43,13 +43,11 @@ void MeshImpl::addVertex(float x, float y, float z) {
 
 void MeshImpl::addTriangle(unsigned int a, unsigned int b, unsigned int c) {
   data.triangles.push_back({a, b, c});
-  addedTriangles_.push_back({a, b, c});
 }
 
 void MeshImpl::restoreAdded() {
   if (!prepared) return;
   data.vertices = addedVertices_;
-  data.triangles = addedTriangles_;
   data.boundingBox = addedBox_;
   data.normalizeOffset = {0.0f, 0.0f, 0.0f};
   data.normalizeScale = 1.0f;

@@ -102,9 +102,10 @@ class MeshImpl : public IMesh {
   void addTriangle(unsigned int a, unsigned int b, unsigned int c) override;
   ~MeshImpl() override;
 
-  /// Puts back the vertices, triangles and box the host added, when a binding has prepared `data` since:
-  /// preparation rewrites them in place, and a second binding must start from what the host gave, not
-  /// from the unit frame of the first (whose padded box would shift every position again).
+  /// Puts back the vertices and box the host added, when a binding has prepared `data` since: preparation
+  /// rewrites them in place, and a second binding must start from what the host gave, not from the unit
+  /// frame of the first (whose padded box would shift every position again). Triangles are only ever
+  /// appended, so `data` keeps the one copy of them.
   void restoreAdded();
 
   MeshData data;
@@ -113,7 +114,6 @@ class MeshImpl : public IMesh {
 
  private:
   std::vector<VertexRecord> addedVertices_;
-  std::vector<TriangleRecord> addedTriangles_;
   Collision::AABB addedBox_;
 };
 
