@@ -35,8 +35,11 @@ void buildDirectedEdges(MeshData& mesh, std::size_t vertexCount) {
   countingSort(corners, byB, vertexCount, [](const Corner& e) { return e.b; });
   countingSort(byB, corners, vertexCount, [](const Corner& e) { return e.a; });
 
+  // A closed manifold has every corner's edge once: the count is exact there and an upper bound anywhere.
   mesh.edges.clear();
+  mesh.edges.reserve(corners.size());
   mesh.edgeOpposite.clear();
+  mesh.edgeOpposite.reserve(corners.size());
   mesh.edgeStart.assign(vertexCount + 1, 0);
   for (std::size_t i = 0; i < corners.size(); ++i) {
     const Corner& e = corners[i];
