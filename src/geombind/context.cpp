@@ -30,25 +30,6 @@ void initialiseHostGlew() {
   }
 }
 
-// The host's objects, validated before anything is changed: a mesh the methods could not read safely
-// leaves both untouched and gives an empty result.
-struct BindInputs {
-  MeshData* mesh = nullptr;
-  HierarchyData* hierarchy = nullptr;
-};
-
-BindInputs bindInputs(IMesh* mesh, ITransformHierarchy* hierarchy) {
-  // Objects a host made itself rather than through the factories carry no data to bind.
-  auto* meshImpl = dynamic_cast<MeshImpl*>(mesh);
-  auto* hierarchyImpl = dynamic_cast<TransformHierarchyImpl*>(hierarchy);
-  if (meshImpl == nullptr || hierarchyImpl == nullptr) return {};
-  meshImpl->restoreAdded();
-  hierarchyImpl->restoreAdded();
-  if (!isBindable(meshImpl->data)) return {};
-  meshImpl->prepared = hierarchyImpl->prepared = true;
-  return {&meshImpl->data, &hierarchyImpl->data};
-}
-
 VertexWeights runStrategy(Algorithm::IBindStrategy& strategy,
                           const BindInputs& inputs,
                           const Algorithm::IBindOptions& options,
@@ -58,6 +39,20 @@ VertexWeights runStrategy(Algorithm::IBindStrategy& strategy,
 }
 
 }  // namespace
+
+BindInputs prepareBindInputs(IMesh* mesh, ITransformHierarchy* hierarchy, PreparationMode mode) {
+  // Objects a host made itself rather than through the factories carry no data to bind.
+  auto* meshImpl = dynamic_cast<MeshImpl*>(mesh);
+  auto* hierarchyImpl = dynamic_cast<TransformHierarchyImpl*>(hierarchy);
+  if (meshImpl == nullptr || hierarchyImpl == nullptr) return {};
+  meshImpl->restoreAdded();
+  hierarchyImpl->restoreAdded();
+  if (!isBindable(meshImpl->data)) return {};
+  meshImpl->prepared = hierarchyImpl->prepared = true;
+  prepareForBinding(meshImpl->data, hierarchyImpl->data, mode);
+  if (mode == PreparationMode::heatmap) Algorithm::computeVertexNormals(meshImpl->data);
+  return {&meshImpl->data, &hierarchyImpl->data};
+}
 
 float clampFalloff(float falloff) { return std::min(1.0f, std::max(0.0f, falloff)); }
 
@@ -87,9 +82,8 @@ ISparseVertexWeights* ContextImpl::bindGeodesicSparseVoxel(IMesh* mesh,
                                                            int resolution,
                                                            bool refineInterior) {
   result.perVertex = VertexWeights();
-  const BindInputs inputs = bindInputs(mesh, hierarchy);
+  const BindInputs inputs = prepareBindInputs(mesh, hierarchy, PreparationMode::geodesic);
   if (inputs.mesh == nullptr) return &result;
-  prepareForBinding(*inputs.mesh, *inputs.hierarchy, PreparationMode::geodesic);
 
   Algorithm::GeodesicSparseVoxelOptions options;
   options.resolution = resolution;
@@ -113,10 +107,8 @@ ISparseVertexWeights* ContextImpl::bindHeatmap(IMesh* mesh,
                                                float falloff,
                                                unsigned int influenceLimit) {
   result.perVertex = VertexWeights();
-  const BindInputs inputs = bindInputs(mesh, hierarchy);
+  const BindInputs inputs = prepareBindInputs(mesh, hierarchy, PreparationMode::heatmap);
   if (inputs.mesh == nullptr) return &result;
-  prepareForBinding(*inputs.mesh, *inputs.hierarchy, PreparationMode::heatmap);
-  Algorithm::computeVertexNormals(*inputs.mesh);
 
   Algorithm::HeatmapOptions options;
   options.influenceLimit = static_cast<std::int32_t>(influenceLimit);

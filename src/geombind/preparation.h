@@ -18,7 +18,8 @@ std::array<float, 3> normalizePoint(const MeshData& mesh, const std::array<float
 /// Moves and scales the mesh so its box starts at the origin and its longest side is 1.
 void normalizeMesh(MeshData& mesh);
 
-/// Rebuilds edges, edgeOpposite, vertexNeighbours and vertexTriangles from the triangles.
+/// Rebuilds edges, edgeOpposite, edgeStart, vertexNeighbours and vertexTriangles from the triangles, in
+/// time linear in the vertex and triangle counts. A mesh without vertices or triangles keeps its tables.
 void buildTopology(MeshData& mesh);
 
 /// Which method a preparation is for: the geodesic method voxelises a fixed cube around the unit frame.

@@ -3,6 +3,9 @@
 #include <array>
 #include <limits>
 #include <map>
+#include <optional>
+#include <random>
+#include <set>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -67,14 +70,32 @@ TEST(PreparationRepeat, JointsWithoutVerticesKeepTheirPositions) {
   EXPECT_EQ(bones.data.transforms[0][1], 0.0);
 }
 
+using Lists = std::vector<std::vector<std::uint32_t>>;
+
+Lists lists(const IndexRows& rows) {
+  Lists out;
+  for (std::size_t r = 0; r < rows.size(); ++r) out.emplace_back(rows[r].begin(), rows[r].end());
+  return out;
+}
+
+// Read back through the lookup the methods use, so the table and the lookup are checked together.
+std::map<DirectedEdge, std::uint32_t> oppositeOfEveryEdge(const MeshData& mesh) {
+  std::map<DirectedEdge, std::uint32_t> out;
+  for (const DirectedEdge& e : mesh.edges) {
+    const std::optional<std::uint32_t> o = mesh.findOpposite(e.first, e.second);
+    if (o) out[e] = *o;
+  }
+  return out;
+}
+
 struct TopologyCase {
   const char* name;
   int vertexCount;
   std::vector<TriangleRecord> triangles;
   std::vector<DirectedEdge> edges;
   std::map<DirectedEdge, std::uint32_t> opposite;
-  std::vector<std::vector<std::uint32_t>> neighbours;
-  std::vector<std::vector<std::uint32_t>> incident;
+  Lists neighbours;
+  Lists incident;
 };
 
 void PrintTo(const TopologyCase& c, std::ostream* os) { *os << c.name; }
@@ -88,9 +109,9 @@ TEST_P(Topology, BuildsTheAdjacencyTables) {
   for (const auto& t : c.triangles) mesh.addTriangle(t[0], t[1], t[2]);
   buildTopology(mesh.data);
   EXPECT_EQ(mesh.data.edges, c.edges);
-  EXPECT_EQ(mesh.data.edgeOpposite, c.opposite);
-  EXPECT_EQ(mesh.data.vertexNeighbours, c.neighbours);
-  EXPECT_EQ(mesh.data.vertexTriangles, c.incident);
+  EXPECT_EQ(oppositeOfEveryEdge(mesh.data), c.opposite);
+  EXPECT_EQ(lists(mesh.data.vertexNeighbours), c.neighbours);
+  EXPECT_EQ(lists(mesh.data.vertexTriangles), c.incident);
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -131,6 +152,59 @@ INSTANTIATE_TEST_SUITE_P(
             {{1, 2, 3}, {0, 2, 3}, {0, 1, 3}, {0, 1, 2}, {}},
             {{0, 1, 3}, {0, 1, 2}, {0, 2, 3}, {1, 2, 3}, {}}}),
     [](const auto& info) { return std::string(info.param.name); });
+
+// A soup over 50 of 60 vertices, so the last ten are isolated: random triangles repeat directed edges
+// with other opposite vertices, some repeat whole triangles or corners. Each round adds triangles to the
+// same mesh, so a rebuild must also drop the previous tables.
+TEST(TopologySoup, MatchesOrderedSetsBuiltTriangleByTriangle) {
+  constexpr std::uint32_t kVertices = 60, kUsed = 50;
+  std::mt19937 rng(7);
+  std::uniform_int_distribution<std::uint32_t> vertex(0, kUsed - 1);
+  MeshData mesh;
+  mesh.vertices.resize(kVertices);
+  for (int round = 0; round < 3; ++round) {
+    for (int t = 0; t < 200; ++t) {
+      const bool repeat = !mesh.triangles.empty() && rng() % 5 == 0;
+      TriangleRecord tri = repeat ? mesh.triangles[rng() % mesh.triangles.size()]
+                                  : TriangleRecord{vertex(rng), vertex(rng), vertex(rng)};
+      if (rng() % 10 == 0) tri[rng() % 3] = tri[0];  // degenerate corners
+      mesh.triangles.push_back(tri);
+    }
+    buildTopology(mesh);
+
+    std::vector<std::set<std::uint32_t>> neighbours(kVertices), incident(kVertices);
+    std::map<DirectedEdge, std::uint32_t> opposite;
+    for (std::uint32_t t = 0; t < mesh.triangles.size(); ++t) {
+      const TriangleRecord& tri = mesh.triangles[t];
+      for (int i = 0; i < 3; ++i) {
+        const std::uint32_t a = tri[i], b = tri[(i + 1) % 3];
+        neighbours[a].insert(b);
+        neighbours[b].insert(a);
+        opposite[{a, b}] = tri[(i + 2) % 3];
+        incident[a].insert(t);
+      }
+    }
+    std::vector<DirectedEdge> edges;
+    for (const auto& entry : opposite) edges.push_back(entry.first);
+    Lists neighbourLists, incidentLists;
+    for (std::uint32_t v = 0; v < kVertices; ++v) {
+      neighbourLists.emplace_back(neighbours[v].begin(), neighbours[v].end());
+      incidentLists.emplace_back(incident[v].begin(), incident[v].end());
+    }
+
+    EXPECT_EQ(mesh.edges, edges) << "round " << round;
+    EXPECT_EQ(lists(mesh.vertexNeighbours), neighbourLists) << "round " << round;
+    EXPECT_EQ(lists(mesh.vertexTriangles), incidentLists) << "round " << round;
+    for (std::uint32_t a = 0; a < kVertices; ++a) {
+      for (std::uint32_t b = 0; b < kVertices; ++b) {
+        const auto found = opposite.find({a, b});
+        const std::optional<std::uint32_t> expected =
+            found == opposite.end() ? std::nullopt : std::optional<std::uint32_t>(found->second);
+        ASSERT_EQ(mesh.findOpposite(a, b), expected) << a << " -> " << b << ", round " << round;
+      }
+    }
+  }
+}
 
 struct BadMeshCase {
   const char* name;

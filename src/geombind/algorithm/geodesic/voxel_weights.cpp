@@ -67,7 +67,7 @@ void smoothWeights(
 #pragma omp parallel for schedule(static) num_threads(processorThreads())
     for (std::int64_t v = 0; v < count; ++v) {
       const auto i = static_cast<std::size_t>(v);
-      const std::vector<std::uint32_t>& neighbours = mesh.vertexNeighbours[i];
+      const IndexRows::Row neighbours = mesh.vertexNeighbours[i];
       std::vector<BoneWeight>& out = target[i];
       if (neighbours.empty() || out.empty()) continue;
       const auto& pi = mesh.vertices[i].position;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <optional>
 
 #include "geombind/parallel.h"
 
@@ -24,8 +25,8 @@ double cotangentAt(const MeshData& mesh, std::uint32_t i, std::uint32_t k, std::
 
 double oppositeCotangent(
     const MeshData& mesh, std::uint32_t from, std::uint32_t to, std::uint32_t i, std::uint32_t k) {
-  const auto found = mesh.edgeOpposite.find({from, to});
-  return found == mesh.edgeOpposite.end() ? 0.0 : cotangentAt(mesh, i, k, found->second);
+  const std::optional<std::uint32_t> opposite = mesh.findOpposite(from, to);
+  return opposite ? cotangentAt(mesh, i, k, *opposite) : 0.0;
 }
 
 }  // namespace

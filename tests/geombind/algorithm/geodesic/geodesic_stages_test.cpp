@@ -223,7 +223,7 @@ class Smoothing : public ::testing::Test {
  protected:
   void SetUp() override {
     for (float x : {0.0f, 1.0f, 4.0f}) mesh.vertices.push_back({{0, 0, 0}, {x, 0, 0}});
-    mesh.vertexNeighbours = {{1}, {0, 2}, {1}};
+    mesh.vertexNeighbours = IndexRows::fromLists({{1}, {0, 2}, {1}});
     weights = {{{0, 1.0}, {1, 0.0}}, {{0, 0.5}, {1, 0.5}}, {{0, 0.0}, {1, 1.0}}};
   }
   MeshData mesh;
