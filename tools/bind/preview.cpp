@@ -12,6 +12,7 @@
 #include <stb_image_write.h>
 
 #include "headless_gl/headless_gl.h"
+#include "preview_raster.h"
 #include "preview_scene.h"
 
 namespace tessik::bind {
@@ -190,6 +191,7 @@ std::vector<std::uint8_t> renderPreviewPixels(const SurfaceMesh& mesh,
                                               const VertexWeights& weights,
                                               const PreviewOptions& options) {
   const preview::Scene scene = preview::makeScene(mesh, skeleton, jointWorld, weights, options);
+  if (options.device == PreviewDevice::cpu) return preview::rasterizeScene(mesh, scene);
   if (mesh.triangles.size() > static_cast<std::size_t>(INT_MAX / 3))
     throw std::invalid_argument("the mesh has too many triangles to draw in one call");
   if (support::currentGLVersionString().empty())

@@ -1,0 +1,184 @@
+#include "preview_raster.h"
+
+#include <algorithm>
+#include <array>
+#include <climits>
+#include <cmath>
+#include <cstddef>
+
+namespace tessik::bind::preview {
+
+namespace {
+
+// Rows of samples per band: small enough that the bands of an 800-pixel picture outnumber the threads
+// many times over (the figure is rarely spread evenly down the picture), large enough that a triangle
+// seldom straddles two bands and is set up twice.
+constexpr int kBandRows = 8;
+
+using Point = std::array<double, 2>;  // window coordinates: samples from the lower left corner
+
+std::uint8_t toUnorm8(float c) {
+  return static_cast<std::uint8_t>(std::lrint(std::min(std::max(c, 0.0f), 1.0f) * 255.0f));
+}
+
+// The colour and depth samples of the drawing, rows bottom to top as GL keeps them.
+struct Target {
+  int width, height;
+  std::vector<std::uint8_t> colour;  // RGBA8
+  std::vector<float> depth;          // 0 at the near plane, 1 at the far one
+};
+
+// One edge a -> b of a counter-clockwise triangle as e(p) = A x + B y + C, positive on the inside. Where
+// e is zero the sample goes to the triangle on whose side A (then B) is positive: a shared edge has
+// opposite coefficients in its two triangles, so exactly one of them takes the sample.
+struct Edge {
+  double a, b, c;
+  bool takesTies;
+  bool covers(double e) const { return e > 0.0 || (e == 0.0 && takesTies); }
+};
+
+Edge edge(const Point& from, const Point& to, double sign) {
+  const double a = sign * (from[1] - to[1]), b = sign * (to[0] - from[0]);
+  return {a, b, -(a * from[0] + b * from[1]), a > 0.0 || (a == 0.0 && b > 0.0)};
+}
+
+// Calls plot(index, l) for each sample of rows [rowBegin, rowEnd) whose centre the triangle covers, in
+// row then column order; l holds the sample's barycentric weights of corners 0, 1 and 2.
+template <class Plot>
+void coverTriangle(const std::array<Point, 3>& p, int width, int rowBegin, int rowEnd, Plot&& plot) {
+  const double area = (p[1][0] - p[0][0]) * (p[2][1] - p[0][1]) - (p[2][0] - p[0][0]) * (p[1][1] - p[0][1]);
+  if (!(area != 0.0) || !std::isfinite(area)) return;  // edge-on: GL draws nothing of it either
+  const double sign = area > 0.0 ? 1.0 : -1.0;         // both faces are drawn
+  const std::array<Edge, 3> edges = {edge(p[1], p[2], sign), edge(p[2], p[0], sign), edge(p[0], p[1], sign)};
+  const double inverseArea = 1.0 / std::fabs(area);
+
+  // Sample centres sit at half-integers: the first column at or right of the leftmost corner and so on.
+  const auto [xLo, xHi] = std::minmax({p[0][0], p[1][0], p[2][0]});
+  const auto [yLo, yHi] = std::minmax({p[0][1], p[1][1], p[2][1]});
+  const int x0 = static_cast<int>(std::max(std::ceil(xLo - 0.5), 0.0));
+  const int x1 = static_cast<int>(std::min(std::floor(xHi - 0.5), width - 1.0));
+  const int y0 = static_cast<int>(std::max(std::ceil(yLo - 0.5), static_cast<double>(rowBegin)));
+  const int y1 = static_cast<int>(std::min(std::floor(yHi - 0.5), rowEnd - 1.0));
+  for (int y = y0; y <= y1; ++y) {
+    const double cy = y + 0.5;
+    const double r0 = edges[0].b * cy + edges[0].c, r1 = edges[1].b * cy + edges[1].c,
+                 r2 = edges[2].b * cy + edges[2].c;
+    const std::size_t row = static_cast<std::size_t>(y) * width;
+    for (int x = x0; x <= x1; ++x) {
+      const double cx = x + 0.5;
+      const double e0 = edges[0].a * cx + r0, e1 = edges[1].a * cx + r1, e2 = edges[2].a * cx + r2;
+      if (edges[0].covers(e0) && edges[1].covers(e1) && edges[2].covers(e2))
+        plot(row + x, std::array<double, 3>{e0 * inverseArea, e1 * inverseArea, e2 * inverseArea});
+    }
+  }
+}
+
+// The glOrtho and viewport transforms of the OpenGL path, from mesh units to window coordinates and depth.
+struct Viewport {
+  double scaleX, scaleY, left, bottom, depthScale, nearZ;
+
+  Viewport(const Framing& f, int width, int height)
+      : scaleX(width / (f.right - f.left)),
+        scaleY(height / (f.top - f.bottom)),
+        left(f.left),
+        bottom(f.bottom),
+        depthScale(1.0 / (f.zFar - f.zNear)),
+        nearZ(-f.zNear) {}
+
+  Point window(double x, double y) const { return {(x - left) * scaleX, (y - bottom) * scaleY}; }
+  float depth(double z) const { return static_cast<float>((nearZ - z) * depthScale); }
+};
+
+// The row bands each triangle reaches, as one list per band in drawing order.
+std::vector<std::vector<std::uint32_t>> binByBand(const std::vector<Point>& window,
+                                                  const SurfaceMesh& mesh,
+                                                  int bands,
+                                                  int height) {
+  std::vector<std::vector<std::uint32_t>> bins(static_cast<std::size_t>(bands));
+  for (std::size_t t = 0; t < mesh.triangles.size(); ++t) {
+    const auto& tri = mesh.triangles[t];
+    const auto [lo, hi] = std::minmax({window[tri[0]][1], window[tri[1]][1], window[tri[2]][1]});
+    const double first = std::max(std::ceil(lo - 0.5), 0.0),
+                 last = std::min(std::floor(hi - 0.5), height - 1.0);
+    if (!(first <= last)) continue;
+    for (int band = static_cast<int>(first) / kBandRows; band <= static_cast<int>(last) / kBandRows; ++band)
+      bins[static_cast<std::size_t>(band)].push_back(static_cast<std::uint32_t>(t));
+  }
+  return bins;
+}
+
+}  // namespace
+
+std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& scene) {
+  const int factor = supersampleFactor(scene.width, scene.height, INT_MAX);
+  Target target{scene.width * factor, scene.height * factor, {}, {}};
+  const std::size_t samples = static_cast<std::size_t>(target.width) * target.height;
+  target.colour.resize(samples * 4);
+  target.depth.resize(samples);
+  const Viewport viewport(scene.framing, target.width, target.height);
+
+  const auto vertexCount = static_cast<std::ptrdiff_t>(mesh.positions.size());
+  std::vector<Point> window(mesh.positions.size());
+  std::vector<float> depth(mesh.positions.size());
+  std::vector<std::array<float, 4>> colour(mesh.positions.size());
+#pragma omp parallel for schedule(static)
+  for (std::ptrdiff_t v = 0; v < vertexCount; ++v) {
+    const Vec3f& p = mesh.positions[static_cast<std::size_t>(v)];
+    const Vec3f& c = scene.vertexColours[static_cast<std::size_t>(v)];
+    window[static_cast<std::size_t>(v)] = viewport.window(p[0], p[1]);
+    depth[static_cast<std::size_t>(v)] = viewport.depth(p[2]);
+    colour[static_cast<std::size_t>(v)] = {c[0], c[1], c[2], 1.0f};
+  }
+  const int bands = (target.height + kBandRows - 1) / kBandRows;
+  const std::vector<std::vector<std::uint32_t>> bins = binByBand(window, mesh, bands, target.height);
+
+  std::vector<std::array<Point, 3>> flat;  // the skeleton's triangles, in painting order
+  std::vector<std::array<std::uint8_t, 4>> flatColour;
+  for (const FlatLayer& layer : scene.skeleton) {
+    const std::array<std::uint8_t, 4> rgba = {toUnorm8(layer.colour[0]), toUnorm8(layer.colour[1]),
+                                              toUnorm8(layer.colour[2]), 255};
+    for (std::size_t i = 0; i + 2 < layer.corners.size(); i += 3) {
+      flat.push_back({viewport.window(layer.corners[i][0], layer.corners[i][1]),
+                      viewport.window(layer.corners[i + 1][0], layer.corners[i + 1][1]),
+                      viewport.window(layer.corners[i + 2][0], layer.corners[i + 2][1])});
+      flatColour.push_back(rgba);
+    }
+  }
+
+  const std::array<std::uint8_t, 4> background = {toUnorm8(kBackground[0]), toUnorm8(kBackground[1]),
+                                                  toUnorm8(kBackground[2]), 255};
+  // Each band clears, fills and paints only its own rows, so no sample is ever touched by two threads.
+#pragma omp parallel for schedule(static, 1)
+  for (int band = 0; band < bands; ++band) {
+    const int rowBegin = band * kBandRows, rowEnd = std::min(rowBegin + kBandRows, target.height);
+    const std::size_t begin = static_cast<std::size_t>(rowBegin) * target.width;
+    const std::size_t end = static_cast<std::size_t>(rowEnd) * target.width;
+    for (std::size_t s = begin; s < end; ++s) {
+      std::copy(background.begin(), background.end(), &target.colour[4 * s]);
+      target.depth[s] = 1.0f;
+    }
+    for (std::uint32_t t : bins[static_cast<std::size_t>(band)]) {
+      const auto& tri = mesh.triangles[t];
+      const std::array<Point, 3> corners = {window[tri[0]], window[tri[1]], window[tri[2]]};
+      coverTriangle(
+          corners, target.width, rowBegin, rowEnd, [&](std::size_t s, const std::array<double, 3>& l) {
+            const float z =
+                static_cast<float>(l[0] * depth[tri[0]] + l[1] * depth[tri[1]] + l[2] * depth[tri[2]]);
+            // Outside [0, 1] GL clips the sample away; otherwise the first drawn of equal depths stays.
+            if (!(z >= 0.0f && z <= 1.0f && z < target.depth[s])) return;
+            target.depth[s] = z;
+            for (int k = 0; k < 4; ++k)
+              target.colour[4 * s + k] = toUnorm8(static_cast<float>(
+                  l[0] * colour[tri[0]][k] + l[1] * colour[tri[1]][k] + l[2] * colour[tri[2]][k]));
+          });
+    }
+    for (std::size_t f = 0; f < flat.size(); ++f)
+      coverTriangle(flat[f], target.width, rowBegin, rowEnd,
+                    [&](std::size_t s, const std::array<double, 3>&) {
+                      std::copy(flatColour[f].begin(), flatColour[f].end(), &target.colour[4 * s]);
+                    });
+  }
+  return downsampleFlipped(target.colour, scene.width, scene.height, factor);
+}
+
+}  // namespace tessik::bind::preview
