@@ -5,6 +5,7 @@
 #include <climits>
 #include <cmath>
 #include <cstddef>
+#include <cstring>
 
 namespace tessik::bind::preview {
 
@@ -18,7 +19,7 @@ constexpr int kBandRows = 8;
 using Point = std::array<double, 2>;  // window coordinates: samples from the lower left corner
 
 std::uint8_t toUnorm8(float c) {
-  return static_cast<std::uint8_t>(std::lrint(std::min(std::max(c, 0.0f), 1.0f) * 255.0f));
+  return static_cast<std::uint8_t>(std::min(std::max(c, 0.0f), 1.0f) * 255.0f + 0.5f);
 }
 
 // The colour and depth samples of the drawing, rows bottom to top as GL keeps them.
@@ -46,19 +47,21 @@ Edge edge(const Point& from, const Point& to, double sign) {
 // row then column order; l holds the sample's barycentric weights of corners 0, 1 and 2.
 template <class Plot>
 void coverTriangle(const std::array<Point, 3>& p, int width, int rowBegin, int rowEnd, Plot&& plot) {
+  // Sample centres sit at half-integers: the first column at or right of the leftmost corner and so on.
+  // Most triangles miss most bands, so this test comes before any setup.
+  const auto [yLo, yHi] = std::minmax({p[0][1], p[1][1], p[2][1]});
+  const int y0 = static_cast<int>(std::max(std::ceil(yLo - 0.5), static_cast<double>(rowBegin)));
+  const int y1 = static_cast<int>(std::min(std::floor(yHi - 0.5), rowEnd - 1.0));
+  if (y0 > y1) return;
+  const auto [xLo, xHi] = std::minmax({p[0][0], p[1][0], p[2][0]});
+  const int x0 = static_cast<int>(std::max(std::ceil(xLo - 0.5), 0.0));
+  const int x1 = static_cast<int>(std::min(std::floor(xHi - 0.5), width - 1.0));
+  if (x0 > x1) return;
   const double area = (p[1][0] - p[0][0]) * (p[2][1] - p[0][1]) - (p[2][0] - p[0][0]) * (p[1][1] - p[0][1]);
   if (!(area != 0.0) || !std::isfinite(area)) return;  // edge-on: GL draws nothing of it either
   const double sign = area > 0.0 ? 1.0 : -1.0;         // both faces are drawn
   const std::array<Edge, 3> edges = {edge(p[1], p[2], sign), edge(p[2], p[0], sign), edge(p[0], p[1], sign)};
   const double inverseArea = 1.0 / std::fabs(area);
-
-  // Sample centres sit at half-integers: the first column at or right of the leftmost corner and so on.
-  const auto [xLo, xHi] = std::minmax({p[0][0], p[1][0], p[2][0]});
-  const auto [yLo, yHi] = std::minmax({p[0][1], p[1][1], p[2][1]});
-  const int x0 = static_cast<int>(std::max(std::ceil(xLo - 0.5), 0.0));
-  const int x1 = static_cast<int>(std::min(std::floor(xHi - 0.5), width - 1.0));
-  const int y0 = static_cast<int>(std::max(std::ceil(yLo - 0.5), static_cast<double>(rowBegin)));
-  const int y1 = static_cast<int>(std::min(std::floor(yHi - 0.5), rowEnd - 1.0));
   for (int y = y0; y <= y1; ++y) {
     const double cy = y + 0.5;
     const double r0 = edges[0].b * cy + edges[0].c, r1 = edges[1].b * cy + edges[1].c,
@@ -153,10 +156,9 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
     const int rowBegin = band * kBandRows, rowEnd = std::min(rowBegin + kBandRows, target.height);
     const std::size_t begin = static_cast<std::size_t>(rowBegin) * target.width;
     const std::size_t end = static_cast<std::size_t>(rowEnd) * target.width;
-    for (std::size_t s = begin; s < end; ++s) {
-      std::copy(background.begin(), background.end(), &target.colour[4 * s]);
-      target.depth[s] = 1.0f;
-    }
+    for (std::size_t s = begin; s < end; ++s) std::memcpy(&target.colour[4 * s], background.data(), 4);
+    std::fill(target.depth.begin() + static_cast<std::ptrdiff_t>(begin),
+              target.depth.begin() + static_cast<std::ptrdiff_t>(end), 1.0f);
     for (std::uint32_t t : bins[static_cast<std::size_t>(band)]) {
       const auto& tri = mesh.triangles[t];
       const std::array<Point, 3> corners = {window[tri[0]], window[tri[1]], window[tri[2]]};
@@ -175,7 +177,7 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
     for (std::size_t f = 0; f < flat.size(); ++f)
       coverTriangle(flat[f], target.width, rowBegin, rowEnd,
                     [&](std::size_t s, const std::array<double, 3>&) {
-                      std::copy(flatColour[f].begin(), flatColour[f].end(), &target.colour[4 * s]);
+                      std::memcpy(&target.colour[4 * s], flatColour[f].data(), 4);
                     });
   }
   return downsampleFlipped(target.colour, scene.width, scene.height, factor);

@@ -152,6 +152,27 @@ std::vector<FlatLayer> skeletonLayers(const Skeleton& skeleton,
   return layers;
 }
 
+// The factor as a constant lets the compiler unroll the block sums; this runs over every sample.
+template <int kFactor>
+std::vector<std::uint8_t> downsampleFlippedBy(const std::vector<std::uint8_t>& big, int width, int height) {
+  std::vector<std::uint8_t> pixels(static_cast<std::size_t>(width) * height * 4);
+  const std::size_t bigWidth = static_cast<std::size_t>(width) * kFactor;
+  constexpr int kSamples = kFactor * kFactor;
+#pragma omp parallel for schedule(static)
+  for (int y = 0; y < height; ++y) {
+    const std::uint8_t* rows = &big[static_cast<std::size_t>(y) * kFactor * bigWidth * 4];
+    std::uint8_t* out = &pixels[static_cast<std::size_t>(height - 1 - y) * width * 4];
+    for (int x = 0; x < width; ++x)
+      for (int c = 0; c < 4; ++c) {
+        int sum = 0;
+        for (int dy = 0; dy < kFactor; ++dy)
+          for (int dx = 0; dx < kFactor; ++dx) sum += rows[(dy * bigWidth + x * kFactor + dx) * 4 + c];
+        out[x * 4 + c] = static_cast<std::uint8_t>((sum + kSamples / 2) / kSamples);
+      }
+  }
+  return pixels;
+}
+
 }  // namespace
 
 Scene makeScene(const SurfaceMesh& mesh,
@@ -182,21 +203,8 @@ std::vector<std::uint8_t> downsampleFlipped(const std::vector<std::uint8_t>& big
                                             int width,
                                             int height,
                                             int factor) {
-  std::vector<std::uint8_t> pixels(static_cast<std::size_t>(width) * height * 4);
-  const std::size_t bigWidth = static_cast<std::size_t>(width) * factor;
-  const int samples = factor * factor;
-#pragma omp parallel for schedule(static)
-  for (int y = 0; y < height; ++y)
-    for (int x = 0; x < width; ++x)
-      for (int c = 0; c < 4; ++c) {
-        int sum = 0;
-        for (int dy = 0; dy < factor; ++dy)
-          for (int dx = 0; dx < factor; ++dx)
-            sum += big[(static_cast<std::size_t>(y * factor + dy) * bigWidth + x * factor + dx) * 4 + c];
-        pixels[(static_cast<std::size_t>(height - 1 - y) * width + x) * 4 + c] =
-            static_cast<std::uint8_t>((sum + samples / 2) / samples);
-      }
-  return pixels;
+  return factor == kSupersample ? downsampleFlippedBy<kSupersample>(big, width, height)
+                                : downsampleFlippedBy<1>(big, width, height);
 }
 
 }  // namespace preview
