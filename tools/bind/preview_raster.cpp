@@ -15,6 +15,7 @@ namespace {
 // many times over (the figure is rarely spread evenly down the picture), large enough that a triangle
 // seldom straddles two bands and is set up twice.
 constexpr int kBandRows = 8;
+static_assert(kBandRows % 2 == 0, "a band holds whole rows of supersampled pixels");
 
 using Point = std::array<double, 2>;  // window coordinates: samples from the lower left corner
 
@@ -148,9 +149,11 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
     }
   }
 
+  std::vector<std::uint8_t> pixels(static_cast<std::size_t>(scene.width) * scene.height * 4);
   const std::array<std::uint8_t, 4> background = {toUnorm8(kBackground[0]), toUnorm8(kBackground[1]),
                                                   toUnorm8(kBackground[2]), 255};
-  // Each band clears, fills and paints only its own rows, so no sample is ever touched by two threads.
+  // Each band clears, fills, paints and averages only its own rows, so no sample or pixel is ever touched
+  // by two threads.
 #pragma omp parallel for schedule(static, 1)
   for (int band = 0; band < bands; ++band) {
     const int rowBegin = band * kBandRows, rowEnd = std::min(rowBegin + kBandRows, target.height);
@@ -179,8 +182,10 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
                     [&](std::size_t s, const std::array<double, 3>&) {
                       std::memcpy(&target.colour[4 * s], flatColour[f].data(), 4);
                     });
+    downsampleRowsFlipped(target.colour, scene.width, scene.height, factor, rowBegin / factor,
+                          rowEnd / factor, pixels);
   }
-  return downsampleFlipped(target.colour, scene.width, scene.height, factor);
+  return pixels;
 }
 
 }  // namespace tessik::bind::preview

@@ -154,23 +154,19 @@ std::vector<FlatLayer> skeletonLayers(const Skeleton& skeleton,
 
 // The factor as a constant lets the compiler unroll the block sums; this runs over every sample.
 template <int kFactor>
-std::vector<std::uint8_t> downsampleFlippedBy(const std::vector<std::uint8_t>& big, int width, int height) {
-  std::vector<std::uint8_t> pixels(static_cast<std::size_t>(width) * height * 4);
-  const std::size_t bigWidth = static_cast<std::size_t>(width) * kFactor;
+void downsampleRowFlipped(
+    const std::vector<std::uint8_t>& big, int width, int height, int y, std::vector<std::uint8_t>& pixels) {
   constexpr int kSamples = kFactor * kFactor;
-#pragma omp parallel for schedule(static)
-  for (int y = 0; y < height; ++y) {
-    const std::uint8_t* rows = &big[static_cast<std::size_t>(y) * kFactor * bigWidth * 4];
-    std::uint8_t* out = &pixels[static_cast<std::size_t>(height - 1 - y) * width * 4];
-    for (int x = 0; x < width; ++x)
-      for (int c = 0; c < 4; ++c) {
-        int sum = 0;
-        for (int dy = 0; dy < kFactor; ++dy)
-          for (int dx = 0; dx < kFactor; ++dx) sum += rows[(dy * bigWidth + x * kFactor + dx) * 4 + c];
-        out[x * 4 + c] = static_cast<std::uint8_t>((sum + kSamples / 2) / kSamples);
-      }
-  }
-  return pixels;
+  const std::size_t bigWidth = static_cast<std::size_t>(width) * kFactor;
+  const std::uint8_t* rows = &big[static_cast<std::size_t>(y) * kFactor * bigWidth * 4];
+  std::uint8_t* out = &pixels[static_cast<std::size_t>(height - 1 - y) * width * 4];
+  for (int x = 0; x < width; ++x)
+    for (int c = 0; c < 4; ++c) {
+      int sum = 0;
+      for (int dy = 0; dy < kFactor; ++dy)
+        for (int dx = 0; dx < kFactor; ++dx) sum += rows[(dy * bigWidth + x * kFactor + dx) * 4 + c];
+      out[x * 4 + c] = static_cast<std::uint8_t>((sum + kSamples / 2) / kSamples);
+    }
 }
 
 }  // namespace
@@ -203,8 +199,25 @@ std::vector<std::uint8_t> downsampleFlipped(const std::vector<std::uint8_t>& big
                                             int width,
                                             int height,
                                             int factor) {
-  return factor == kSupersample ? downsampleFlippedBy<kSupersample>(big, width, height)
-                                : downsampleFlippedBy<1>(big, width, height);
+  std::vector<std::uint8_t> pixels(static_cast<std::size_t>(width) * height * 4);
+#pragma omp parallel for schedule(static)
+  for (int y = 0; y < height; ++y) downsampleRowsFlipped(big, width, height, factor, y, y + 1, pixels);
+  return pixels;
+}
+
+void downsampleRowsFlipped(const std::vector<std::uint8_t>& big,
+                           int width,
+                           int height,
+                           int factor,
+                           int rowBegin,
+                           int rowEnd,
+                           std::vector<std::uint8_t>& pixels) {
+  for (int y = rowBegin; y < rowEnd; ++y) {
+    if (factor == kSupersample)
+      downsampleRowFlipped<kSupersample>(big, width, height, y, pixels);
+    else
+      downsampleRowFlipped<1>(big, width, height, y, pixels);
+  }
 }
 
 }  // namespace preview

@@ -54,4 +54,14 @@ std::vector<std::uint8_t> downsampleFlipped(const std::vector<std::uint8_t>& big
                                             int height,
                                             int factor);
 
+// The same for output rows [rowBegin, rowEnd) only, counted from the bottom as `big`'s rows are, into
+// `pixels` of width * height * 4 bytes; lets a drawing average each band while it is still in cache.
+void downsampleRowsFlipped(const std::vector<std::uint8_t>& big,
+                           int width,
+                           int height,
+                           int factor,
+                           int rowBegin,
+                           int rowEnd,
+                           std::vector<std::uint8_t>& pixels);
+
 }  // namespace tessik::bind::preview
