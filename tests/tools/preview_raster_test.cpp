@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <stdexcept>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -132,17 +131,6 @@ TEST_F(PreviewOnCpu, SameBytesForAnyThreadCount) {
   draw(bent, 203, 157);
   omp_set_num_threads(threads);
   EXPECT_TRUE(image == serial);
-}
-
-TEST_F(PreviewOnCpu, RejectsWhatTheOpenGLPathRejects) {
-  const PreviewInput tube = tessik::test::previewTube();
-  const PreviewOptions tooSmall{15, 64, PreviewDevice::cpu};
-  EXPECT_THROW(renderPreviewPixels(tube.mesh, tube.skeleton, tube.jointWorld, tube.weights, tooSmall),
-               std::invalid_argument);
-  const std::vector<Mat4> fewer(tube.jointWorld.begin(), tube.jointWorld.end() - 1);
-  EXPECT_THROW(
-      renderPreviewPixels(tube.mesh, tube.skeleton, fewer, tube.weights, {64, 64, PreviewDevice::cpu}),
-      std::invalid_argument);
 }
 
 }  // namespace

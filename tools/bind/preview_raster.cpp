@@ -121,17 +121,16 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
   target.depth.resize(samples);
   const Viewport viewport(scene.framing, target.width, target.height);
 
-  const auto vertexCount = static_cast<std::ptrdiff_t>(mesh.positions.size());
+  // Serial: a few operations per vertex cost less than another parallel region's barrier.
   std::vector<Point> window(mesh.positions.size());
   std::vector<float> depth(mesh.positions.size());
   std::vector<std::array<float, 4>> colour(mesh.positions.size());
-#pragma omp parallel for schedule(static)
-  for (std::ptrdiff_t v = 0; v < vertexCount; ++v) {
-    const Vec3f& p = mesh.positions[static_cast<std::size_t>(v)];
-    const Vec3f& c = scene.vertexColours[static_cast<std::size_t>(v)];
-    window[static_cast<std::size_t>(v)] = viewport.window(p[0], p[1]);
-    depth[static_cast<std::size_t>(v)] = viewport.depth(p[2]);
-    colour[static_cast<std::size_t>(v)] = {c[0], c[1], c[2], 1.0f};
+  for (std::size_t v = 0; v < mesh.positions.size(); ++v) {
+    const Vec3f& p = mesh.positions[v];
+    const Vec3f& c = scene.vertexColours[v];
+    window[v] = viewport.window(p[0], p[1]);
+    depth[v] = viewport.depth(p[2]);
+    colour[v] = {c[0], c[1], c[2], 1.0f};
   }
   const int bands = (target.height + kBandRows - 1) / kBandRows;
   const std::vector<std::vector<std::uint32_t>> bins = binByBand(window, mesh, bands, target.height);
