@@ -23,9 +23,10 @@ std::uint8_t toUnorm8(float c) {
   return static_cast<std::uint8_t>(std::min(std::max(c, 0.0f), 1.0f) * 255.0f + 0.5f);
 }
 
-// The colour and depth samples of the drawing, rows bottom to top as GL keeps them.
-struct Target {
-  int width, height;
+// The colour and depth samples of one band of rows, bottom to top as GL keeps them. Each thread reuses
+// one for every band it draws: a whole supersampled picture would be tens of megabytes to page in and
+// zero, and freeing it costs every core a TLB flush.
+struct Band {
   std::vector<std::uint8_t> colour;  // RGBA8
   std::vector<float> depth;          // 0 at the near plane, 1 at the far one
 };
@@ -115,11 +116,8 @@ std::vector<std::vector<std::uint32_t>> binByBand(const std::vector<Point>& wind
 
 std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& scene) {
   const int factor = supersampleFactor(scene.width, scene.height, INT_MAX);
-  Target target{scene.width * factor, scene.height * factor, {}, {}};
-  const std::size_t samples = static_cast<std::size_t>(target.width) * target.height;
-  target.colour.resize(samples * 4);
-  target.depth.resize(samples);
-  const Viewport viewport(scene.framing, target.width, target.height);
+  const int sampleWidth = scene.width * factor, sampleHeight = scene.height * factor;
+  const Viewport viewport(scene.framing, sampleWidth, sampleHeight);
 
   // Serial: a few operations per vertex cost less than another parallel region's barrier.
   std::vector<Point> window(mesh.positions.size());
@@ -132,8 +130,8 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
     depth[v] = viewport.depth(p[2]);
     colour[v] = {c[0], c[1], c[2], 1.0f};
   }
-  const int bands = (target.height + kBandRows - 1) / kBandRows;
-  const std::vector<std::vector<std::uint32_t>> bins = binByBand(window, mesh, bands, target.height);
+  const int bands = (sampleHeight + kBandRows - 1) / kBandRows;
+  const std::vector<std::vector<std::uint32_t>> bins = binByBand(window, mesh, bands, sampleHeight);
 
   std::vector<std::array<Point, 3>> flat;  // the skeleton's triangles, in painting order
   std::vector<std::array<std::uint8_t, 4>> flatColour;
@@ -152,37 +150,44 @@ std::vector<std::uint8_t> rasterizeScene(const SurfaceMesh& mesh, const Scene& s
   const std::array<std::uint8_t, 4> background = {toUnorm8(kBackground[0]), toUnorm8(kBackground[1]),
                                                   toUnorm8(kBackground[2]), 255};
   // Each band clears, fills, paints and averages only its own rows, so no sample or pixel is ever touched
-  // by two threads.
-#pragma omp parallel for schedule(static, 1)
-  for (int band = 0; band < bands; ++band) {
-    const int rowBegin = band * kBandRows, rowEnd = std::min(rowBegin + kBandRows, target.height);
-    const std::size_t begin = static_cast<std::size_t>(rowBegin) * target.width;
-    const std::size_t end = static_cast<std::size_t>(rowEnd) * target.width;
-    for (std::size_t s = begin; s < end; ++s) std::memcpy(&target.colour[4 * s], background.data(), 4);
-    std::fill(target.depth.begin() + static_cast<std::ptrdiff_t>(begin),
-              target.depth.begin() + static_cast<std::ptrdiff_t>(end), 1.0f);
-    for (std::uint32_t t : bins[static_cast<std::size_t>(band)]) {
-      const auto& tri = mesh.triangles[t];
-      const std::array<Point, 3> corners = {window[tri[0]], window[tri[1]], window[tri[2]]};
-      coverTriangle(
-          corners, target.width, rowBegin, rowEnd, [&](std::size_t s, const std::array<double, 3>& l) {
-            const float z =
-                static_cast<float>(l[0] * depth[tri[0]] + l[1] * depth[tri[1]] + l[2] * depth[tri[2]]);
-            // Outside [0, 1] GL clips the sample away; otherwise the first drawn of equal depths stays.
-            if (!(z >= 0.0f && z <= 1.0f && z < target.depth[s])) return;
-            target.depth[s] = z;
-            for (int k = 0; k < 4; ++k)
-              target.colour[4 * s + k] = toUnorm8(static_cast<float>(
-                  l[0] * colour[tri[0]][k] + l[1] * colour[tri[1]][k] + l[2] * colour[tri[2]][k]));
-          });
+  // by two threads and which thread takes a band changes nothing. Bands are handed out as threads come
+  // free: on cores shared with other work a fixed split leaves every thread waiting for the slowest.
+#pragma omp parallel
+  {
+    Band target{std::vector<std::uint8_t>(static_cast<std::size_t>(sampleWidth) * kBandRows * 4),
+                std::vector<float>(static_cast<std::size_t>(sampleWidth) * kBandRows)};
+#pragma omp for schedule(dynamic, 1)
+    for (int band = 0; band < bands; ++band) {
+      const int rowBegin = band * kBandRows, rowEnd = std::min(rowBegin + kBandRows, sampleHeight);
+      // Sample indices arrive counted from the picture's first row; the band holds its own rows only.
+      const std::size_t first = static_cast<std::size_t>(rowBegin) * sampleWidth;
+      const std::size_t count = static_cast<std::size_t>(rowEnd - rowBegin) * sampleWidth;
+      for (std::size_t s = 0; s < count; ++s) std::memcpy(&target.colour[4 * s], background.data(), 4);
+      std::fill(target.depth.begin(), target.depth.begin() + static_cast<std::ptrdiff_t>(count), 1.0f);
+      for (std::uint32_t t : bins[static_cast<std::size_t>(band)]) {
+        const auto& tri = mesh.triangles[t];
+        const std::array<Point, 3> corners = {window[tri[0]], window[tri[1]], window[tri[2]]};
+        coverTriangle(
+            corners, sampleWidth, rowBegin, rowEnd, [&](std::size_t at, const std::array<double, 3>& l) {
+              const std::size_t s = at - first;
+              const float z =
+                  static_cast<float>(l[0] * depth[tri[0]] + l[1] * depth[tri[1]] + l[2] * depth[tri[2]]);
+              // Outside [0, 1] GL clips the sample away; otherwise the first drawn of equal depths stays.
+              if (!(z >= 0.0f && z <= 1.0f && z < target.depth[s])) return;
+              target.depth[s] = z;
+              for (int k = 0; k < 4; ++k)
+                target.colour[4 * s + k] = toUnorm8(static_cast<float>(
+                    l[0] * colour[tri[0]][k] + l[1] * colour[tri[1]][k] + l[2] * colour[tri[2]][k]));
+            });
+      }
+      for (std::size_t f = 0; f < flat.size(); ++f)
+        coverTriangle(flat[f], sampleWidth, rowBegin, rowEnd,
+                      [&](std::size_t at, const std::array<double, 3>&) {
+                        std::memcpy(&target.colour[4 * (at - first)], flatColour[f].data(), 4);
+                      });
+      downsampleRowsFlipped(target.colour.data(), scene.width, scene.height, factor, rowBegin / factor,
+                            rowEnd / factor, pixels.data());
     }
-    for (std::size_t f = 0; f < flat.size(); ++f)
-      coverTriangle(flat[f], target.width, rowBegin, rowEnd,
-                    [&](std::size_t s, const std::array<double, 3>&) {
-                      std::memcpy(&target.colour[4 * s], flatColour[f].data(), 4);
-                    });
-    downsampleRowsFlipped(target.colour, scene.width, scene.height, factor, rowBegin / factor,
-                          rowEnd / factor, pixels);
   }
   return pixels;
 }

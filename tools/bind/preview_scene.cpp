@@ -153,18 +153,17 @@ std::vector<FlatLayer> skeletonLayers(const Skeleton& skeleton,
 }
 
 // The factor as a constant lets the compiler unroll the block sums; this runs over every sample.
+// `samples` starts at the first sample row of output row y (counted from the bottom).
 template <int kFactor>
-void downsampleRowFlipped(
-    const std::vector<std::uint8_t>& big, int width, int height, int y, std::vector<std::uint8_t>& pixels) {
+void downsampleRowFlipped(const std::uint8_t* samples, int width, int height, int y, std::uint8_t* pixels) {
   constexpr int kSamples = kFactor * kFactor;
-  const std::size_t bigWidth = static_cast<std::size_t>(width) * kFactor;
-  const std::uint8_t* rows = &big[static_cast<std::size_t>(y) * kFactor * bigWidth * 4];
-  std::uint8_t* out = &pixels[static_cast<std::size_t>(height - 1 - y) * width * 4];
+  const std::size_t sampleWidth = static_cast<std::size_t>(width) * kFactor;
+  std::uint8_t* out = pixels + static_cast<std::size_t>(height - 1 - y) * width * 4;
   for (int x = 0; x < width; ++x)
     for (int c = 0; c < 4; ++c) {
       int sum = 0;
       for (int dy = 0; dy < kFactor; ++dy)
-        for (int dx = 0; dx < kFactor; ++dx) sum += rows[(dy * bigWidth + x * kFactor + dx) * 4 + c];
+        for (int dx = 0; dx < kFactor; ++dx) sum += samples[(dy * sampleWidth + x * kFactor + dx) * 4 + c];
       out[x * 4 + c] = static_cast<std::uint8_t>((sum + kSamples / 2) / kSamples);
     }
 }
@@ -200,23 +199,27 @@ std::vector<std::uint8_t> downsampleFlipped(const std::vector<std::uint8_t>& big
                                             int height,
                                             int factor) {
   std::vector<std::uint8_t> pixels(static_cast<std::size_t>(width) * height * 4);
+  const std::size_t sampleRow = static_cast<std::size_t>(width) * factor * 4;
 #pragma omp parallel for schedule(static)
-  for (int y = 0; y < height; ++y) downsampleRowsFlipped(big, width, height, factor, y, y + 1, pixels);
+  for (int y = 0; y < height; ++y)
+    downsampleRowsFlipped(&big[y * factor * sampleRow], width, height, factor, y, y + 1, pixels.data());
   return pixels;
 }
 
-void downsampleRowsFlipped(const std::vector<std::uint8_t>& big,
+void downsampleRowsFlipped(const std::uint8_t* samples,
                            int width,
                            int height,
                            int factor,
                            int rowBegin,
                            int rowEnd,
-                           std::vector<std::uint8_t>& pixels) {
+                           std::uint8_t* pixels) {
+  const std::size_t sampleRows = static_cast<std::size_t>(width) * factor * factor * 4;  // per output row
   for (int y = rowBegin; y < rowEnd; ++y) {
+    const std::uint8_t* row = samples + (y - rowBegin) * sampleRows;
     if (factor == kSupersample)
-      downsampleRowFlipped<kSupersample>(big, width, height, y, pixels);
+      downsampleRowFlipped<kSupersample>(row, width, height, y, pixels);
     else
-      downsampleRowFlipped<1>(big, width, height, y, pixels);
+      downsampleRowFlipped<1>(row, width, height, y, pixels);
   }
 }
 

@@ -54,14 +54,15 @@ std::vector<std::uint8_t> downsampleFlipped(const std::vector<std::uint8_t>& big
                                             int height,
                                             int factor);
 
-// The same for output rows [rowBegin, rowEnd) only, counted from the bottom as `big`'s rows are, into
-// `pixels` of width * height * 4 bytes; lets a drawing average each band while it is still in cache.
-void downsampleRowsFlipped(const std::vector<std::uint8_t>& big,
+// The same for output rows [rowBegin, rowEnd) only, counted from the bottom, from `samples`, which
+// starts at the first sample row of output row rowBegin; writes them into `pixels`, the whole
+// width * height * 4 byte picture. Lets a drawing average each band of samples while it is in cache.
+void downsampleRowsFlipped(const std::uint8_t* samples,
                            int width,
                            int height,
                            int factor,
                            int rowBegin,
                            int rowEnd,
-                           std::vector<std::uint8_t>& pixels);
+                           std::uint8_t* pixels);
 
 }  // namespace tessik::bind::preview
