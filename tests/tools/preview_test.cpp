@@ -5,6 +5,7 @@
 #include <cmath>
 #include <cstdint>
 #include <cstdio>
+#include <ostream>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -14,6 +15,7 @@
 
 #include "gl/gl_api.h"
 #include "pose.h"
+#include "preview_scenes.h"
 #include "support/gl_context_fixture.h"
 
 namespace {
@@ -22,42 +24,22 @@ using namespace tessik::bind;
 
 using Rgb = std::array<int, 3>;
 
-Mat4 translate(double x, double y, double z) { return {1, 0, 0, x, 0, 1, 0, y, 0, 0, 1, z, 0, 0, 0, 1}; }
-
 // Each channel over the largest, so that shading, which scales all three alike, drops out.
 std::array<float, 3> chroma(float r, float g, float b) {
   const float top = std::max({r, g, b, 1e-6f});
   return {r / top, g / top, b / top};
 }
 
-// An open tube of radius 0.3 along +Y from y = 0 to 2 with joints at y = 0, 1 and 2: rings below y = 1
-// follow joint 0, rings above it joint 1, the middle ring both by half.
 class PreviewTube : public tessik::test::GLContextTest {
  protected:
   void SetUp() override {
     GLContextTest::SetUp();
     if (IsSkipped() || HasFatalFailure()) return;
-    constexpr int kRings = 9, kSegments = 24;
-    for (int r = 0; r < kRings; ++r) {
-      const float y = 2.0f * r / (kRings - 1);
-      for (int s = 0; s < kSegments; ++s) {
-        const float a = 6.2831853f * s / kSegments;
-        mesh.positions.push_back({0.3f * std::cos(a), y, 0.3f * std::sin(a)});
-        if (y < 1.0f) weights.influences.push_back({0, 1.0f});
-        if (y == 1.0f) weights.influences.insert(weights.influences.end(), {{0, 0.5f}, {1, 0.5f}});
-        if (y > 1.0f) weights.influences.push_back({1, 1.0f});
-        weights.offsets.push_back(static_cast<std::uint32_t>(weights.influences.size()));
-        if (r + 1 == kRings) continue;
-        const auto at = [&](int ring, int seg) {
-          return static_cast<std::uint32_t>(ring * kSegments + seg % kSegments);
-        };
-        mesh.triangles.push_back({at(r, s), at(r + 1, s), at(r, s + 1)});
-        mesh.triangles.push_back({at(r, s + 1), at(r + 1, s), at(r + 1, s + 1)});
-      }
-    }
-    skeleton.joints = {
-        {"hip", -1, translate(0, 0, 0)}, {"knee", 0, translate(0, 1, 0)}, {"toe", 1, translate(0, 2, 0)}};
-    for (const auto& joint : skeleton.joints) bindPoses.push_back(joint.bindPose);
+    tessik::test::PreviewInput tube = tessik::test::previewTube();
+    mesh = std::move(tube.mesh);
+    skeleton = std::move(tube.skeleton);
+    weights = std::move(tube.weights);
+    bindPoses = std::move(tube.jointWorld);
   }
 
   std::vector<std::uint8_t> render(const SurfaceMesh& shown, const std::vector<Mat4>& world) const {
@@ -174,5 +156,90 @@ TEST_F(PreviewTube, RejectsSizesAndJointListsThatDoNotFit) {
                std::invalid_argument);
   EXPECT_THROW(render(mesh, {bindPoses.begin(), bindPoses.end() - 1}), std::invalid_argument);
 }
+
+// Where the processor's picture strays from OpenGL's. A pixel is covered when it is not the background;
+// mask faults are pixels covered in one picture only that lie more than 2 pixels from every edge of GL's
+// silhouette, and colour agreement is the share of pixels covered in either picture whose channels
+// differ by at most 8.
+struct PictureDifference {
+  int maskFaults = 0;
+  double colourAgreement = 0.0;
+};
+
+PictureDifference compare(const std::vector<std::uint8_t>& gl,
+                          const std::vector<std::uint8_t>& cpu,
+                          int width,
+                          int height) {
+  const auto differ = [](const std::uint8_t* a, const std::uint8_t* b, int tolerance) {
+    return std::abs(a[0] - b[0]) > tolerance || std::abs(a[1] - b[1]) > tolerance ||
+           std::abs(a[2] - b[2]) > tolerance;
+  };
+  // The framing's margin keeps the corners clear of the figure.
+  const std::uint8_t* background = gl.data();
+  std::vector<char> glMask(gl.size() / 4), cpuMask(gl.size() / 4);
+  for (std::size_t i = 0; i < glMask.size(); ++i) {
+    glMask[i] = differ(&gl[4 * i], background, 4);
+    cpuMask[i] = differ(&cpu[4 * i], background, 4);
+  }
+  PictureDifference d;
+  int covered = 0, agreeing = 0;
+  for (int y = 0; y < height; ++y)
+    for (int x = 0; x < width; ++x) {
+      const std::size_t i = static_cast<std::size_t>(y) * width + x;
+      if (glMask[i] || cpuMask[i]) {
+        ++covered;
+        agreeing += differ(&gl[4 * i], &cpu[4 * i], 8) ? 0 : 1;
+      }
+      if (glMask[i] == cpuMask[i]) continue;
+      bool nearEdge = false;
+      for (int v = std::max(y - 2, 0); v <= std::min(y + 2, height - 1); ++v)
+        for (int u = std::max(x - 2, 0); u <= std::min(x + 2, width - 1); ++u)
+          nearEdge = nearEdge || glMask[static_cast<std::size_t>(v) * width + u] != glMask[i];
+      d.maskFaults += nearEdge ? 0 : 1;
+    }
+  d.colourAgreement = covered > 0 ? static_cast<double>(agreeing) / covered : 0.0;
+  return d;
+}
+
+struct DeviceCase {
+  const char* name;
+  tessik::test::PreviewInput (*make)();
+  int width, height;
+};
+
+void PrintTo(const DeviceCase& c, std::ostream* os) { *os << c.name; }
+
+class PreviewDevices : public tessik::test::GLContextTest,
+                       public ::testing::WithParamInterface<DeviceCase> {};
+
+TEST_P(PreviewDevices, CpuDrawsWhatGLDraws) {
+  const DeviceCase& c = GetParam();
+  const tessik::test::PreviewInput in = c.make();
+  PreviewOptions options{c.width, c.height, PreviewDevice::opengl};
+  const std::vector<std::uint8_t> gl =
+      renderPreviewPixels(in.mesh, in.skeleton, in.jointWorld, in.weights, options);
+  options.device = PreviewDevice::cpu;
+  const std::vector<std::uint8_t> cpu =
+      renderPreviewPixels(in.mesh, in.skeleton, in.jointWorld, in.weights, options);
+  ASSERT_EQ(gl.size(), cpu.size());
+  const PictureDifference d = compare(gl, cpu, c.width, c.height);
+  EXPECT_EQ(d.maskFaults, 0);
+  EXPECT_GE(d.colourAgreement, 0.97);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Preview,
+    PreviewDevices,
+    ::testing::Values(DeviceCase{"tube", tessik::test::previewTube, 256, 320},
+                      DeviceCase{"character", tessik::test::previewCharacter, 400, 400},
+                      DeviceCase{"bent_character",
+                                 [] {
+                                   tessik::test::PreviewInput in = tessik::test::previewCharacter();
+                                   in.jointWorld = posedJointTransforms(in.skeleton, {{"l_elbow", 0, 0, 70}});
+                                   in.mesh = deformMesh(in.mesh, in.skeleton, in.jointWorld, in.weights);
+                                   return in;
+                                 },
+                                 320, 200}),
+    [](const ::testing::TestParamInfo<DeviceCase>& info) { return std::string(info.param.name); });
 
 }  // namespace
