@@ -63,6 +63,9 @@ pl::Options pipelineOptions(const BindOptions& options) {
   o.refineInterior = options.refineInterior;
   o.leafTips = options.leafTips;
   o.verbose = options.verbose;
+  o.voxelizer = options.voxelizer == "gpu"   ? pl::Voxelizer::gpu
+                : options.voxelizer == "cpu" ? pl::Voxelizer::cpu
+                                             : pl::Voxelizer::automatic;
   return o;
 }
 
@@ -194,13 +197,17 @@ void readNames(py::handle object, BindInput& in) {
 // same one the command-line tool calls.
 BindOutput run(const BindInput& in, const BindOptions& options, ProgressBridge& progress) {
   BindOutput out;
-  // Declared before the binding so that it outlives the binding context the pipeline makes in it.
+  // Declared before the binding so that it outlives the binding context the pipeline makes in it. Only
+  // the geodesic method's GPU voxelizer draws; automatic keeps a context only when it is hardware.
   std::optional<support::HeadlessGLContext> headless;
   // Without a context the pipeline still checks the input first, so bad arguments are reported as such;
   // the reason no context could be made replaces its plainer message below.
   std::string noContext;
-  if (!support::ensureGLContext(headless, &noContext) && noContext.empty())
-    noContext = "no headless OpenGL context could be made";
+  if (options.method == BindMethod::Geodesic && options.voxelizer != "cpu") {
+    const bool gpu = options.voxelizer == "gpu";
+    if (!support::acquireGLForGpuWork(headless, gpu, &noContext) && gpu && noContext.empty())
+      noContext = "no headless OpenGL context could be made";
+  }
   pl::Mesh mesh;
   mesh.positions.resize(in.vertexCount());
   for (std::size_t v = 0; v < in.vertexCount(); ++v)

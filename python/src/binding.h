@@ -28,6 +28,7 @@ struct BindOptions {
   bool refineInterior = false;
   bool leafTips = true;
   bool verbose = false;
+  std::string voxelizer = "auto";  // geodesic: "auto", "gpu" or "cpu"
 };
 
 // Validates the inputs, binds with the GIL released and returns (bone_indices, weights), both (V, k)

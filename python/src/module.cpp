@@ -86,8 +86,8 @@ ValueError
 BindingError
     No piece of the surface could reach any bone (see the message).
 OpenGLUnavailableError
-    No OpenGL context is current and no headless one could be made; the message
-    says which packages provide one.
+    ``voxelizer="gpu"`` was asked for, and no OpenGL context is current and no
+    headless one could be made; the message says which packages provide one.
 KeyboardInterrupt, or what ``progress`` raised
     The binding was cancelled; nothing is returned.
 
@@ -101,10 +101,8 @@ std::string heatmapDoc() {
 
 Bone weights by heat diffusion over the surface (bone heat).
 
-Heat flows from the bones each vertex can see along the mesh surface. The method
-itself issues no OpenGL calls, but the library creates its binding context only
-with an OpenGL context current, so without one a headless context is made for
-the call, as for bind_geodesic.
+Heat flows from the bones each vertex can see along the mesh surface. Needs no
+OpenGL: nothing of it is loaded for this call.
 
 Parameters
 ----------)doc") +
@@ -113,14 +111,14 @@ Parameters
 
 std::string geodesicDoc() {
   return std::string(
-             R"doc(bind_geodesic($module, vertices, triangles, joints, parents, names=None, *, falloff=0.5, max_influences=4, resolution=64, refine_interior=False, progress=None)
+             R"doc(bind_geodesic($module, vertices, triangles, joints, parents, names=None, *, falloff=0.5, max_influences=4, resolution=64, refine_interior=False, leaf_tips=True, verbose=False, voxelizer="auto", progress=None)
 --
 
 Bone weights from geodesic distances through the voxelised mesh volume.
 
-Needs an OpenGL 2.1 context for the interior voxelisation: the one current on
-the calling thread, or else a headless (EGL, surfaceless) context made for the
-duration of the call. The library prints its stage timings to standard output.
+The inside of the mesh is voxelised on the processor or on the GPU (see
+``voxelizer``); the two decide the same voxels but for ties within half a voxel
+of the surface.
 
 Parameters
 ----------)doc") +
@@ -129,7 +127,14 @@ resolution : int, default 64
     Voxels along the longest side of the mesh box, 8 to 1024. Time and memory
     grow with its cube; thin parts need enough voxels across them.
 refine_interior : bool, default False
-    Classify the interior voxels more carefully, at some extra cost.)doc" +
+    Classify the interior voxels more carefully, at some extra cost.
+voxelizer : {"auto", "gpu", "cpu"}, default "auto"
+    Where the inside is voxelised. "auto" uses the GPU when a hardware OpenGL
+    context is current or can be made headless, and the processor otherwise
+    (a software renderer such as Mesa's llvmpipe is far slower than it); "gpu"
+    needs an OpenGL 2.1 context (the current one, or a headless EGL one made for
+    the call) and raises OpenGLUnavailableError without one; "cpu" never loads
+    OpenGL.)doc" +
          kSharedProgress;
 }
 
@@ -223,8 +228,11 @@ PYBIND11_MODULE(tessik, m) {
       "bind_geodesic",
       [](py::handle vertices, py::handle triangles, py::handle joints, py::handle parents, py::handle names,
          double falloff, long long maxInfluences, long long resolution, bool refineInterior, bool leafTips,
-         bool verbose, py::object progress) {
+         bool verbose, std::string voxelizer, py::object progress) {
+        if (voxelizer != "auto" && voxelizer != "gpu" && voxelizer != "cpu")
+          throw py::value_error("voxelizer = '" + voxelizer + "' is none of \"auto\", \"gpu\" and \"cpu\"");
         BindOptions options;
+        options.voxelizer = voxelizer;
         options.method = BindMethod::Geodesic;
         options.leafTips = leafTips;
         options.verbose = verbose;
@@ -238,7 +246,7 @@ PYBIND11_MODULE(tessik, m) {
       geodesicDoc().c_str(), py::arg("vertices"), py::arg("triangles"), py::arg("joints"), py::arg("parents"),
       py::arg("names") = py::none(), py::kw_only(), py::arg("falloff") = 0.5, py::arg("max_influences") = 4,
       py::arg("resolution") = 64, py::arg("refine_interior") = false, py::arg("leaf_tips") = true,
-      py::arg("verbose") = false, py::arg("progress") = py::none());
+      py::arg("verbose") = false, py::arg("voxelizer") = "auto", py::arg("progress") = py::none());
 
   m.def("to_dense", &tessik::python::denseWeights, kDenseDoc, py::arg("bone_indices"), py::arg("weights"),
         py::arg("num_bones") = py::none());

@@ -146,3 +146,8 @@ def test_bad_deform_input_raises_value_error_naming_it(overrides, message):
 def test_bad_to_dense_input_raises_value_error(bone_indices, weights, num_bones, message):
     with pytest.raises(ValueError, match=message):
         tessik.to_dense(bone_indices, weights, num_bones)
+
+
+def test_an_unknown_voxelizer_is_refused():
+    with pytest.raises(ValueError, match="voxelizer = 'opengl' is none of"):
+        tessik.bind_geodesic(*ARM, voxelizer="opengl")

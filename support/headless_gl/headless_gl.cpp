@@ -381,4 +381,11 @@ bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error)
   return true;
 }
 
+bool acquireGLForGpuWork(std::optional<HeadlessGLContext>& made, bool anyRenderer, std::string* error) {
+  if (!ensureGLContext(made, error)) return false;
+  if (anyRenderer || !TessikSDK::GL::softwareRenderer()) return true;
+  made.reset();
+  return false;
+}
+
 }  // namespace tessik::support

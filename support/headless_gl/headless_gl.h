@@ -60,8 +60,14 @@ class HeadlessGLContext {
 
 // The one way hosts (tools, Python, tests, benchmarks) get a context to bind in: the context already
 // current on this thread if there is one, otherwise a headless one, made current and stored in `made`
-// (keep it alive while binding). The GL entry points of gl/gl_api.h are loaded either way. Answers false, with the
-// reason in `error` when it is not null, when neither works.
+// (keep it alive while binding). The GL entry points of gl/gl_api.h are loaded either way. Answers false,
+// with the reason in `error` when it is not null, when neither works.
 bool ensureGLContext(std::optional<HeadlessGLContext>& made, std::string* error);
+
+// For hosts choosing where GPU-capable work runs: ensureGLContext, but with `anyRenderer` false a
+// context that renders in software is given up again (one made here is released), because the processor
+// paths are far faster than Mesa's software GL. Answers whether a context is current for the caller.
+// With no GL library installed it loads nothing and answers false.
+bool acquireGLForGpuWork(std::optional<HeadlessGLContext>& made, bool anyRenderer, std::string* error);
 
 }  // namespace tessik::support

@@ -44,6 +44,7 @@ struct BoundRun {
   std::vector<Mat4> posed;  // the joints as --pose turns them (their bind poses when none is given)
   BoundAsset bound;
   std::vector<std::pair<std::string, double>> times;  // per stage of the tool
+  bool drawWithGL = false;  // a hardware (or asked-for) OpenGL context is current for the preview
 };
 
 // Every file the tool can write: the option that names it, the extensions it accepts, the stage whose
@@ -84,6 +85,7 @@ const std::vector<OutputKind>& outputKinds() {
                                        : deformMesh(mesh, run.asset.skeleton, run.posed, run.bound.weights);
          PreviewOptions view;
          view.width = view.height = run.options.previewSize;
+         view.device = run.drawWithGL ? PreviewDevice::opengl : PreviewDevice::cpu;
          renderPreview(staged, shown, run.asset.skeleton, run.posed, run.bound.weights, view);
        }},
   };
@@ -105,17 +107,29 @@ ImportedAsset loadAsset(const ToolOptions& o) {
   return asset;
 }
 
-// `made` holds the headless context when the tool had to make one; the preview draws in it afterwards.
-BoundAsset bindWithContext(const ImportedAsset& asset,
-                           const BindSettings& settings,
-                           gb::IProgress& progress,
-                           std::optional<support::HeadlessGLContext>& made) {
+// Whether the run uses OpenGL, for the geodesic voxelizer and the preview alike. `made` holds the headless
+// context when the tool had to make one. Automatic keeps a context only when it renders in hardware:
+// Mesa's software renderer is far slower than the processor paths, and with no GL library installed the
+// attempt loads nothing and the processor does everything. Throws when the GPU was asked for and no
+// context can be had.
+bool acquireGL(const ToolOptions& o, std::optional<support::HeadlessGLContext>& made) {
+  const pl::Voxelizer choice = o.settings.voxelizer;
+  if (choice == pl::Voxelizer::cpu) return false;
+  const bool geodesic = o.settings.method == BindMethod::geodesic;
+  if (!geodesic && o.previewPath.empty()) return false;
   std::string error;
-  if (!support::ensureGLContext(made, &error))
-    throw Failure(kExitFailed,
-                  "no OpenGL context could be made without a display, and the binding library needs one for "
-                  "either method (--method heatmap included). Details:\n" +
-                      error);
+  const bool gpu = choice == pl::Voxelizer::gpu;
+  if (support::acquireGLForGpuWork(made, gpu, &error)) return true;
+  if (gpu && geodesic)
+    throw Failure(
+        kExitFailed,
+        "--voxelizer gpu needs OpenGL, and no context could be made without a display (--voxelizer cpu "
+        "needs none). Details:\n" +
+            error);
+  return false;
+}
+
+BoundAsset bindOrFail(const ImportedAsset& asset, const BindSettings& settings, gb::IProgress& progress) {
   try {
     return bindAsset(asset.mesh, asset.skeleton, settings, &progress);
   } catch (const pl::BindError& e) {
@@ -171,7 +185,9 @@ void printSummary(const BoundRun& run, std::ostream& out) {
       << "  triangles   " << mesh.triangles.size() << "\n"
       << "  bones       " << run.asset.skeleton.joints.size() << "\n"
       << "  method      " << methodName(o.settings.method);
-  if (o.settings.method == BindMethod::geodesic) out << ", resolution " << o.settings.resolution;
+  if (o.settings.method == BindMethod::geodesic)
+    out << ", resolution " << o.settings.resolution << ", interior voxelised on the "
+        << (r.interiorOnGpu ? "GPU" : "CPU");
   out << ", falloff " << o.settings.falloff << ", max influences " << o.settings.maxInfluences
       << (o.settings.refineInterior ? ", interior refined" : "") << "\n";
   if (o.settings.leafTips) {
@@ -261,10 +277,11 @@ int runBindTool(const ToolOptions& options,
     // A misspelt bone in --pose should fail now, not after a long binding.
     std::vector<Mat4> posed = posedJointTransforms(asset.skeleton, o.pose);
     std::optional<support::HeadlessGLContext> context;
-    BoundAsset bound = timed("bind", [&] { return bindWithContext(asset, o.settings, progress, context); });
+    const bool withGL = acquireGL(o, context);
+    BoundAsset bound = timed("bind", [&] { return bindOrFail(asset, o.settings, progress); });
     if (progress.isCanceled() || (cancel != nullptr && cancel->load()))
       throw Failure(kExitCancelled, "cancelled; nothing was written");
-    BoundRun run{o, std::move(asset), std::move(posed), std::move(bound), {}};
+    BoundRun run{o, std::move(asset), std::move(posed), std::move(bound), {}, withGL};
     writeOutputs(run, cancel, progress, times);
     run.times = std::move(times);
     printSummary(run, out);

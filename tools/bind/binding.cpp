@@ -13,6 +13,7 @@ pl::Options pipelineOptions(const BindSettings& settings) {
   options.falloff = settings.falloff;
   options.maxInfluences = settings.maxInfluences;
   options.refineInterior = settings.refineInterior;
+  options.voxelizer = settings.voxelizer;
   options.leafTips = settings.leafTips;
   options.verbose = settings.verbose;
   return options;

@@ -18,6 +18,8 @@ struct BindSettings {
   float falloff = 0.5f;
   unsigned maxInfluences = 4;  // 0 keeps every influence
   bool refineInterior = false;
+  // Where the geodesic method voxelises the inside; also whether the preview may draw through OpenGL.
+  TessikSDK::Pipeline::Voxelizer voxelizer = TessikSDK::Pipeline::Voxelizer::automatic;
   bool leafTips = true;
   bool verbose = false;  // let the library print its own phase lines and stage table
 };
@@ -30,8 +32,9 @@ struct BoundAsset {
   TessikSDK::Pipeline::Report report;
 };
 
-// Binds `mesh` to `skeleton` through the library's binding pipeline, on the calling thread, whose OpenGL
-// context must be current. Throws TessikSDK::Pipeline::BindError when no weights come back.
+// Binds `mesh` to `skeleton` through the library's binding pipeline, on the calling thread (the GPU
+// voxelizer uses the OpenGL context current there). Throws TessikSDK::Pipeline::BindError when no weights
+// come back.
 BoundAsset bindAsset(const SurfaceMesh& mesh,
                      const Skeleton& skeleton,
                      const BindSettings& settings,

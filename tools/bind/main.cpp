@@ -63,6 +63,13 @@ int main(int argc, char** argv) {
   app.add_flag(
       "--refine-interior", options.settings.refineInterior,
       "voxelise the inside at full resolution too (geodesic method; slower, for thin or nested parts)");
+  std::string voxelizer = "auto";
+  app.add_option(
+         "--voxelizer", voxelizer,
+         "where the geodesic method voxelises the inside: auto takes a hardware GPU when there is "
+         "one and the processor otherwise (also for the preview); gpu needs OpenGL; cpu never loads it")
+      ->check(CLI::IsMember({"auto", "gpu", "cpu"}))
+      ->capture_default_str();
   bool noLeafTips = false;
   app.add_flag(
       "--no-leaf-tips", noLeafTips,
@@ -81,6 +88,9 @@ int main(int argc, char** argv) {
   CLI11_PARSE(app, argc, argv);
 
   options.settings.leafTips = !noLeafTips;
+  using TessikSDK::Pipeline::Voxelizer;
+  options.settings.voxelizer =
+      voxelizer == "gpu" ? Voxelizer::gpu : (voxelizer == "cpu" ? Voxelizer::cpu : Voxelizer::automatic);
   options.settings.method = method == "heatmap" ? BindMethod::heatmap : BindMethod::geodesic;
   try {
     for (const std::string& p : poses) options.pose.push_back(tessik::bind::parseJointRotation(p));
