@@ -1,7 +1,8 @@
 // Cost of a whole geodesic sparse-voxel binding of a character-like mesh (about 50k triangles, 30
 // bones) at the voxel resolutions hosts pick, split by stage.
 //
-// BM_GeodesicBind times GeodesicSparseVoxelBind::bind alone. Each iteration binds a fresh copy of the
+// BM_GeodesicBind times GeodesicSparseVoxelBind::bind alone, with the interior voxelised on the CPU
+// (cpu:1, no OpenGL) or on the GPU (cpu:0). Each iteration binds a fresh copy of the
 // mesh and hierarchy, prepared untimed, because preparation changes both in place and the bind may
 // move joints. Counters:
 //   - one per stage the profiler recorded (sub-stages of the voxel grids prefixed "grids_"), averaged
@@ -145,8 +146,8 @@ VoxelCounts CountSparseVoxels(const Character& character, std::int32_t resolutio
 }
 
 void BM_GeodesicBind(benchmark::State& state) {
-  const std::string& error = tessik::bench::ensureGL();
-  if (!error.empty()) {
+  const bool onCpu = state.range(1) != 0;
+  if (const std::string& error = onCpu ? std::string() : tessik::bench::ensureGL(); !error.empty()) {
     state.SkipWithError(error.c_str());
     return;
   }
@@ -158,6 +159,7 @@ void BM_GeodesicBind(benchmark::State& state) {
   options.falloff = 0.5f;
   options.refineInterior = false;
   options.smoothingIterations = Algorithm::smoothingIterationsFor(resolution);
+  options.voxelizer = onCpu ? Algorithm::InteriorVoxelizer::cpu : Algorithm::InteriorVoxelizer::gpu;
 
   Algorithm::GeodesicSparseVoxelBind strategy;
   TessikSDK::GeomBind::NullProgress progress;
@@ -229,12 +231,14 @@ void RegisterAll() {
     int iterations;
   };
   for (const Size& s : {Size{64, 2}, Size{128, 1}, Size{256, 1}}) {
-    benchmark::RegisterBenchmark("BM_GeodesicBind", BM_GeodesicBind)
-        ->Arg(s.resolution)
-        ->ArgName("res")
-        ->Iterations(s.iterations)
-        ->Unit(benchmark::kMillisecond)
-        ->UseRealTime();
+    for (int cpu : {1, 0}) {
+      benchmark::RegisterBenchmark("BM_GeodesicBind", BM_GeodesicBind)
+          ->Args({s.resolution, cpu})
+          ->ArgNames({"res", "cpu"})
+          ->Iterations(s.iterations)
+          ->Unit(benchmark::kMillisecond)
+          ->UseRealTime();
+    }
   }
 }
 

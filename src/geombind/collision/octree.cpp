@@ -110,9 +110,13 @@ void Octree::reset(const AABB& box) {
 
 void Octree::insert(std::unique_ptr<IOctreeElement> element) {
   if (element == nullptr) return;
-  elements_.reserve(elements_.size() + 1);  // so that the push below cannot fail once it is owned
   owned_.push_back(std::move(element));
-  elements_.push_back(owned_.back().get());
+  try {
+    elements_.push_back(owned_.back().get());
+  } catch (...) {
+    owned_.pop_back();  // not listed, so not kept either
+    throw;
+  }
 }
 
 void Octree::build(std::uint32_t minDepth, std::uint32_t depthLimit) {
