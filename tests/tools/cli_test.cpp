@@ -229,6 +229,23 @@ INSTANTIATE_TEST_SUITE_P(
                 "tessik-bind: --voxelizer gpu needs OpenGL"}),
     [](const ::testing::TestParamInfo<NoGLRun>& info) { return std::string(info.param.name); });
 
+// The processor's voxelizer and every later stage give the same weights whatever the worker count.
+TEST_F(CliTest, CpuWeightsDoNotDependOnTheThreadCount) {
+  std::vector<std::string> csv;
+  for (const char* limit : {"OMP_THREAD_LIMIT=1", "OMP_THREAD_LIMIT=2", "OMP_THREAD_LIMIT=4"}) {
+    const ProcessResult r = runTool(
+        TESSIK_BIND_EXE,
+        {"box.obj", "--skeleton", "bones.json", "--voxelizer", "cpu", "--resolution", "48", "--csv", "w.csv"},
+        dir_.string(), {}, {limit});
+    ASSERT_EQ(r.status, 0) << r.err;
+    std::ifstream in(dir_ / "w.csv");
+    csv.emplace_back(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+  }
+  ASSERT_FALSE(csv[0].empty());
+  EXPECT_EQ(csv[1], csv[0]);
+  EXPECT_EQ(csv[2], csv[0]);
+}
+
 TEST_F(CliTest, InterruptStopsTheRunAndWritesNothing) {
   // A fine grid keeps the binding busy long enough for the signal to land inside it.
   const ProcessResult r = run({"--resolution", "256", "-o", "c.glb", "--preview", "c.png"}, " ...\n");
