@@ -4,8 +4,8 @@
 // its pieces in groups, halving the failing group until the shells are alone.
 //
 // The time is one bindSkin call (heat method). group_cost is that time over the best of three bindings
-// of the character alone, in the same process: about 2 means the groups together cost one failed whole attempt plus one
-// binding.
+// of the character alone, in the same process: about 2 means the groups together cost one failed whole
+// attempt plus one binding.
 
 #include <algorithm>
 #include <array>
