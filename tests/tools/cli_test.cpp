@@ -170,7 +170,13 @@ INSTANTIATE_TEST_SUITE_P(
         BadRun{{"box.obj", "--skeleton", "bones.json"}, "nothing to write"},
         BadRun{{"box.obj", "-o", "out.glb", "--resolution", "4"}, "--resolution"},
         BadRun{{"box.obj", "-o", "out.glb", "--falloff", "1.5"}, "--falloff"},
-        BadRun{{"box.obj", "-o", "out.glb", "--method", "magic"}, "--method"}));
+        BadRun{{"box.obj", "-o", "out.glb", "--method", "magic"}, "--method"},
+        BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "box.obj"}, "would overwrite the input"},
+        BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "./bones.json"},
+               "would overwrite the skeleton"},
+        BadRun{{"box.obj", "--skeleton", "bones.json", "-o", "new.glb", "--csv", "new.glb"}, "both name"},
+        BadRun{{"box.obj", "--skeleton", "bones.json", "-o", "out.glb", "--csv", "out.glb"}, "both name"},
+        BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "/dev/null"}, "is not a regular file"}));
 
 // Machines without OpenGL: no EGL driver (a vendor list naming none leaves libglvnd nothing to load, as
 // on a bare server), or no GL library at all (the shim makes every dlopen of one fail). The processor

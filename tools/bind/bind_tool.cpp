@@ -9,6 +9,9 @@
 #include <optional>
 #include <sstream>
 #include <stdexcept>
+#include <utility>
+
+#include <sys/stat.h>
 
 #include "asset_import.h"
 #include "csv_export.h"
@@ -96,6 +99,43 @@ std::string seconds(double s) {
   std::ostringstream os;
   os << std::fixed << std::setprecision(s < 10 ? 2 : 1) << s << " s";
   return os.str();
+}
+
+// A file as the system knows it, links and other names for it resolved; empty when it does not exist.
+std::optional<std::pair<dev_t, ino_t>> fileIdentity(const std::string& path) {
+  struct stat info {};
+  if (stat(path.c_str(), &info) != 0) return std::nullopt;
+  return std::make_pair(info.st_dev, info.st_ino);
+}
+
+// Outputs must not overwrite an input or each other, and may replace only regular files: a run that
+// overwrote its own mesh, or turned /dev/null into a file, would lose data the user still needs. Checked
+// before importing, so a refused run costs nothing.
+void checkOutputTargets(const ToolOptions& o) {
+  namespace fs = std::filesystem;
+  std::vector<std::pair<const char*, std::string>> inputs;
+  if (!o.input.empty()) inputs.emplace_back("the input", o.input);
+  if (!o.skeletonPath.empty()) inputs.emplace_back("the skeleton", o.skeletonPath);
+  std::vector<std::pair<const char*, std::string>> earlier;
+  for (const OutputKind& kind : outputKinds()) {
+    const std::string& path = o.*kind.path;
+    if (path.empty()) continue;
+    const auto identity = fileIdentity(path);
+    std::error_code ec;
+    if (identity && !fs::is_regular_file(path, ec))
+      throw Failure(kExitFailed,
+                    std::string(kind.option) + " '" + path + "' is not a regular file; it is left alone");
+    for (const auto& [role, input] : inputs)
+      if (identity && identity == fileIdentity(input))
+        throw Failure(kExitFailed, std::string(kind.option) + " '" + path + "' would overwrite " + role);
+    for (const auto& [option, other] : earlier) {
+      const bool same = identity ? identity == fileIdentity(other)
+                                 : fs::weakly_canonical(path, ec) == fs::weakly_canonical(other, ec);
+      if (same)
+        throw Failure(kExitFailed, std::string(option) + " and " + kind.option + " both name '" + path + "'");
+    }
+    earlier.emplace_back(kind.option, path);
+  }
 }
 
 ImportedAsset loadAsset(const ToolOptions& o) {
@@ -273,6 +313,7 @@ int runBindTool(const ToolOptions& options,
   };
 
   try {
+    checkOutputTargets(o);
     ImportedAsset asset = timed("import", [&] { return loadAsset(o); });
     // A misspelt bone in --pose should fail now, not after a long binding.
     std::vector<Mat4> posed = posedJointTransforms(asset.skeleton, o.pose);

@@ -29,6 +29,9 @@ std::string PendingOutputs::stage(const std::string& destination) {
   std::error_code ec;
   if (fs::is_directory(dest, ec))
     throw std::runtime_error("cannot write '" + destination + "': it is a directory");
+  // A device, a FIFO or a socket is never replaced by a file.
+  if (fs::exists(dest, ec) && !fs::is_regular_file(dest, ec))
+    throw std::runtime_error("cannot write '" + destination + "': it is not a regular file");
   const fs::path folder = dest.parent_path().empty() ? fs::path(".") : dest.parent_path();
   const std::string ext = dest.extension().string();
   std::string pattern = (folder / ("." + dest.stem().string() + ".tmp-XXXXXX" + ext)).string();
