@@ -235,6 +235,23 @@ INSTANTIATE_TEST_SUITE_P(
                 "tessik-bind: --voxelizer gpu needs OpenGL"}),
     [](const ::testing::TestParamInfo<NoGLRun>& info) { return std::string(info.param.name); });
 
+// A file-size limit makes the writes fail: the run says so, exits 1 and leaves neither temporaries nor
+// changed files.
+TEST_F(CliTest, WritesPastAFileSizeLimitFailCleanly) {
+  write("out.glb", "precious");
+  const std::set<std::string> before = files();
+  const ProcessResult r = runTool("/bin/sh",
+                                  {"-c", "ulimit -f 4; exec \"$0\" \"$@\"", TESSIK_BIND_EXE, "box.obj",
+                                   "--skeleton", "bones.json", "-o", "out.glb", "--preview", "p.png"},
+                                  dir_.string());
+  EXPECT_EQ(r.status, 1) << r.err;
+  EXPECT_NE(r.err.find("cannot write"), std::string::npos) << r.err;
+  EXPECT_EQ(r.out.find("wrote"), std::string::npos) << r.out;
+  EXPECT_EQ(files(), before);
+  std::ifstream kept(dir_ / "out.glb");
+  EXPECT_EQ(std::string(std::istreambuf_iterator<char>(kept), {}), "precious");
+}
+
 // The processor's voxelizer and every later stage give the same weights whatever the worker count.
 TEST_F(CliTest, CpuWeightsDoNotDependOnTheThreadCount) {
   std::vector<std::string> csv;

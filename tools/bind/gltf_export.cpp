@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <fstream>
+#include <sstream>
 #include <stdexcept>
 #include <string>
 #include <system_error>
@@ -13,6 +14,8 @@
 #include <vector>
 
 #include <tiny_gltf.h>
+
+#include "output_files.h"
 
 namespace tessik::bind {
 namespace {
@@ -401,16 +404,14 @@ int addSkeleton(ModelBuilder& builder, const Skeleton& skeleton) {
 }
 
 void writeModel(const tinygltf::Model& model, const std::string& path, bool binary) {
-  // tinygltf 2.7 reports success for a GLB file it could not open: find out here first.
-  if (!std::ofstream(path, std::ios::binary | std::ios::trunc))
-    throw std::runtime_error("cannot open '" + path + "' for writing");
+  // Serialised in memory (buffers embedded) and written here: tinygltf does not report failed writes.
+  std::ostringstream serialised;
   tinygltf::TinyGLTF gltf;
-  if (!gltf.WriteGltfSceneToFile(&model, path, /*embedImages=*/false, /*embedBuffers=*/true,
-                                 /*prettyPrint=*/true, binary)) {
-    std::error_code ignored;  // a device such as /dev/full is not ours to remove
-    if (std::filesystem::is_regular_file(path, ignored)) std::filesystem::remove(path, ignored);
-    throw std::runtime_error("cannot write '" + path + "'");
-  }
+  tinygltf::Model copy = model;  // the stream writer takes a mutable model
+  if (!gltf.WriteGltfSceneToStream(&copy, serialised, /*prettyPrint=*/true, binary))
+    throw std::runtime_error("cannot write '" + path + "': the model could not be serialised");
+  const std::string bytes = serialised.str();
+  writeFileChecked(path, bytes.data(), bytes.size());
 }
 
 }  // namespace

@@ -25,6 +25,9 @@ void installInterruptHandler() {
   action.sa_flags = SA_RESETHAND;
   sigaction(SIGINT, &action, nullptr);
   sigaction(SIGTERM, &action, nullptr);
+  // Past a file-size limit the write itself fails and the run reports it, removing its temporaries;
+  // the signal's default would kill the process and leave them behind.
+  signal(SIGXFSZ, SIG_IGN);
 }
 
 }  // namespace

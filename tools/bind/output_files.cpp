@@ -21,6 +21,21 @@ mode_t processUmask() {
 
 }  // namespace
 
+void writeFileChecked(const std::string& path, const void* data, std::size_t size) {
+  std::FILE* file = std::fopen(path.c_str(), "wb");
+  if (file == nullptr)
+    throw std::runtime_error("cannot open '" + path + "' for writing: " + std::strerror(errno));
+  errno = 0;
+  const bool written = std::fwrite(data, 1, size, file) == size && std::fflush(file) == 0;
+  const int writeError = errno;
+  const bool closed = std::fclose(file) == 0;
+  if (written && closed) return;
+  const std::string why = std::strerror(writeError != 0 ? writeError : errno);
+  std::error_code ignored;  // a device such as /dev/full is not ours to remove
+  if (std::filesystem::is_regular_file(path, ignored)) std::filesystem::remove(path, ignored);
+  throw std::runtime_error("cannot write '" + path + "': " + why);
+}
+
 PendingOutputs::~PendingOutputs() { discard(); }
 
 std::string PendingOutputs::stage(const std::string& destination) {
@@ -45,6 +60,19 @@ std::string PendingOutputs::stage(const std::string& destination) {
 }
 
 void PendingOutputs::commit() {
+  // Every file reaches the disk before any takes its place: a crash between the renames leaves old or
+  // complete files, never a truncated one under the final name.
+  for (const Entry& e : entries_) {
+    const int fd = open(e.temporary.c_str(), O_RDONLY);
+    const bool synced = fd >= 0 && fsync(fd) == 0;
+    const std::string why = std::strerror(errno);
+    if (fd >= 0) close(fd);
+    if (!synced) {
+      const std::string destination = e.destination;
+      discard();
+      throw std::runtime_error("cannot write '" + destination + "': " + why);
+    }
+  }
   while (!entries_.empty()) {
     const Entry e = entries_.front();
     if (std::rename(e.temporary.c_str(), e.destination.c_str()) != 0) {

@@ -1,9 +1,16 @@
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <vector>
 
 namespace tessik::bind {
+
+// Writes `size` bytes to `path` (created or truncated), checking every write, the flush and the close: a
+// full disk or a file-size limit must fail the run, not leave a truncated file behind a success. On
+// failure removes what it wrote (a regular file only) and throws std::runtime_error naming the path and
+// the reason.
+void writeFileChecked(const std::string& path, const void* data, std::size_t size);
 
 // The files of one run. Each is written under a temporary name beside its destination and renamed into
 // place by commit(), so a failed or cancelled run leaves no half-written file and keeps whatever was

@@ -12,6 +12,7 @@
 
 #include "gl/gl_api.h"
 #include "headless_gl/headless_gl.h"
+#include "output_files.h"
 #include "preview_raster.h"
 #include "preview_scene.h"
 
@@ -267,10 +268,17 @@ void renderPreview(const std::string& pngPath,
   const std::vector<std::uint8_t> rgba = renderPreviewPixels(mesh, skeleton, jointWorld, weights, options);
   std::vector<std::uint8_t> rgb(rgba.size() / 4 * 3);
   for (std::size_t i = 0; i < rgba.size() / 4; ++i) std::memcpy(&rgb[3 * i], &rgba[4 * i], 3);
-  errno = 0;
-  if (stbi_write_png(pngPath.c_str(), options.width, options.height, 3, rgb.data(), options.width * 3) == 0)
-    throw std::runtime_error("cannot write the preview PNG '" + pngPath + "'" +
-                             (errno != 0 ? std::string(": ") + std::strerror(errno) : std::string()));
+  // Encoded in memory and written here: stb reports success whatever the writes did.
+  std::vector<unsigned char> png;
+  auto append = [](void* context, void* data, int size) {
+    auto* out = static_cast<std::vector<unsigned char>*>(context);
+    const auto* bytes = static_cast<const unsigned char*>(data);
+    out->insert(out->end(), bytes, bytes + size);
+  };
+  if (stbi_write_png_to_func(append, &png, options.width, options.height, 3, rgb.data(), options.width * 3) ==
+      0)
+    throw std::runtime_error("cannot encode the preview PNG '" + pngPath + "'");
+  writeFileChecked(pngPath, png.data(), png.size());
 }
 
 }  // namespace tessik::bind
