@@ -8,6 +8,8 @@
 namespace TessikSDK::Pipeline {
 namespace {
 
+constexpr float kMaxCoordinate = 1e18f;
+
 std::string boneLabel(const std::vector<Bone>& bones, std::size_t b) {
   return "bone " + std::to_string(b) + (bones[b].name.empty() ? "" : " ('" + bones[b].name + "')");
 }
@@ -26,8 +28,13 @@ std::string checkMesh(const Mesh& mesh) {
   if (mesh.positions.size() > std::numeric_limits<std::uint32_t>::max())
     return "the mesh has more vertices than 32-bit indices can address";
   for (std::size_t v = 0; v < mesh.positions.size(); ++v)
-    for (float c : mesh.positions[v])
+    for (float c : mesh.positions[v]) {
       if (!std::isfinite(c)) return "vertex " + std::to_string(v) + " has a coordinate that is not finite";
+      // The methods square lengths in single precision on the way to their unit frame.
+      if (std::fabs(c) > kMaxCoordinate)
+        return "vertex " + std::to_string(v) + " has a coordinate of " + std::to_string(c) +
+               ", beyond the 1e18 the binding can scale: scale the mesh and skeleton down first";
+    }
   for (std::size_t t = 0; t < mesh.triangles.size(); ++t)
     for (std::uint32_t corner : mesh.triangles[t])
       if (corner >= mesh.positions.size())

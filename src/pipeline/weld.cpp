@@ -33,15 +33,25 @@ float defaultWeldTolerance(const Mesh& mesh) {
       lo[c] = std::min(lo[c], p[c]);
       hi[c] = std::max(hi[c], p[c]);
     }
-  const float dx = hi[0] - lo[0], dy = hi[1] - lo[1], dz = hi[2] - lo[2];
-  return 1e-6f * std::sqrt(dx * dx + dy * dy + dz * dz);
+  // In double: the squares of a box wider than 1e19 overflow single precision, and an infinite
+  // tolerance would weld every vertex into one.
+  const double dx = double(hi[0]) - lo[0], dy = double(hi[1]) - lo[1], dz = double(hi[2]) - lo[2];
+  return static_cast<float>(1e-6 * std::sqrt(dx * dx + dy * dy + dz * dz));
 }
 
 WeldedMesh weldByPosition(const Mesh& mesh, float tolerance) {
   WeldedMesh out;
   out.weldOf.resize(mesh.positions.size());
   // Cells as wide as the tolerance: a partner can only be in the vertex's own cell or a neighbouring one.
-  const double cell = tolerance > 0.0f ? static_cast<double>(tolerance) : 0.0;
+  // Counted from the mesh's lower corner, so that a small mesh far from the origin cannot push a cell
+  // number past 64 bits.
+  const double cell = tolerance > 0.0f && std::isfinite(tolerance) ? static_cast<double>(tolerance) : 0.0;
+  std::array<double, 3> lower{0.0, 0.0, 0.0};
+  if (!mesh.positions.empty()) {
+    for (int c = 0; c < 3; ++c) lower[c] = mesh.positions[0][c];
+    for (const std::array<float, 3>& p : mesh.positions)
+      for (int c = 0; c < 3; ++c) lower[c] = std::min(lower[c], double(p[c]));
+  }
   auto keyOf = [&](const std::array<float, 3>& p) {
     if (cell == 0.0) {
       // Exact matching: the bit patterns are the key (with -0 folded onto +0).
@@ -53,9 +63,13 @@ WeldedMesh weldByPosition(const Mesh& mesh, float tolerance) {
       };
       return CellKey{bits(p[0]), bits(p[1]), bits(p[2])};
     }
-    return CellKey{static_cast<std::int64_t>(std::floor(p[0] / cell)),
-                   static_cast<std::int64_t>(std::floor(p[1] / cell)),
-                   static_cast<std::int64_t>(std::floor(p[2] / cell))};
+    auto index = [&](int c) {
+      // At most the box's extent over the tolerance, about a million for the default; clamped all the
+      // same, since a caller may pass any tolerance.
+      const double steps = std::floor((double(p[c]) - lower[c]) / cell);
+      return static_cast<std::int64_t>(std::min(steps, 1e15));
+    };
+    return CellKey{index(0), index(1), index(2)};
   };
   std::unordered_map<CellKey, std::vector<std::uint32_t>, CellHash> cells;
   cells.reserve(mesh.positions.size());

@@ -46,6 +46,8 @@ INSTANTIATE_TEST_SUITE_P(
         BadInput{"IndexOutOfRange", [](Mesh& m, auto&, auto&) { m.triangles[0][2] = 3; },
                  "triangle 0 names vertex 3, but the mesh has 3 vertices"},
         BadInput{"NotFinite", [](Mesh& m, auto&, auto&) { m.positions[1][1] = kNaN; }, "vertex 1"},
+        BadInput{"TooFar", [](Mesh& m, auto&, auto&) { m.positions[2][0] = 1e30f; },
+                 "vertex 2 has a coordinate of"},
         BadInput{"OnePoint",
                  [](Mesh& m, auto&, auto&) {
                    m.positions.assign(3, {1, 1, 1});

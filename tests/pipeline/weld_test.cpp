@@ -40,6 +40,20 @@ TEST(WeldTest, SeamSplitCubeBecomesOneClosedSurface) {
   for (const auto& [edge, uses] : edges) EXPECT_EQ(uses, 2);
 }
 
+// Far from the origin and at extreme scales the cube must weld just as it does at unit size: the
+// tolerance of a box wider than 1e19 once overflowed single precision and welded everything.
+TEST(WeldTest, ScaleAndDistanceDoNotChangeTheWeld) {
+  for (const auto& [scale, shift] :
+       std::vector<std::pair<float, float>>{{1e-6f, 1.0f}, {1e20f, 0.0f}, {1e20f, 1e21f}, {1e6f, 1e12f}}) {
+    Mesh cube = splitCube();
+    for (auto& p : cube.positions)
+      for (float& c : p) c = c * scale + shift;
+    const WeldedMesh w = weldByPosition(cube, defaultWeldTolerance(cube));
+    EXPECT_EQ(w.mesh.positions.size(), 8u) << scale << " " << shift;
+    EXPECT_EQ(w.mesh.triangles.size(), 12u) << scale << " " << shift;
+  }
+}
+
 struct ToleranceCase {
   float offset;
   float tolerance;
