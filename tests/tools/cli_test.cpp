@@ -178,6 +178,22 @@ INSTANTIATE_TEST_SUITE_P(
         BadRun{{"box.obj", "--skeleton", "bones.json", "-o", "out.glb", "--csv", "out.glb"}, "both name"},
         BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "/dev/null"}, "is not a regular file"}));
 
+// Bad options are usage errors: status 2 and one line naming the option, whichever check catches them.
+TEST_F(CliTest, BadOptionsExitTwoWithOneLine) {
+  const std::vector<std::vector<std::string>> cases = {{"--resolution", "4"}, {"--falloff", "1.5"},
+                                                       {"--method", "magic"}, {"--voxelizer", "opengl"},
+                                                       {"--no-such-option"},  {"--preview-size", "x"}};
+  for (const std::vector<std::string>& bad : cases) {
+    std::vector<std::string> args = {"box.obj", "--skeleton", "bones.json", "-o", "out.glb"};
+    args.insert(args.end(), bad.begin(), bad.end());
+    const ProcessResult r = run(args);
+    EXPECT_EQ(r.status, 2) << bad[0] << ": " << r.err;
+    EXPECT_EQ(r.err.rfind("tessik-bind: ", 0), 0u) << r.err;
+    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    EXPECT_NE(r.err.find(bad[0]), std::string::npos) << r.err;
+  }
+}
+
 // Machines without OpenGL: no EGL driver (a vendor list naming none leaves libglvnd nothing to load, as
 // on a bare server), or no GL library at all (the shim makes every dlopen of one fail). The processor
 // binds and draws unless the GPU is demanded.

@@ -88,7 +88,17 @@ int main(int argc, char** argv) {
   app.add_option("--pose", poses,
                  "BONE=RX,RY,RZ: turn a bone (degrees, about its own axes) before the preview")
       ->take_all();
-  CLI11_PARSE(app, argc, argv);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::CallForHelp& e) {
+    return app.exit(e);
+  } catch (const CLI::ParseError& e) {
+    // One line and the usage status, as for every other bad option, whatever CLI11's own codes are.
+    std::string line = e.what();
+    line = line.substr(0, line.find('\n'));
+    std::cerr << "tessik-bind: " << line << " (see --help)\n";
+    return tessik::bind::kExitUsage;
+  }
 
   options.settings.leafTips = !noLeafTips;
   using TessikSDK::Pipeline::Voxelizer;
