@@ -266,13 +266,16 @@ const char* functionName(BindMethod method) {
   return method == BindMethod::Heatmap ? "tessik.bind_heatmap" : "tessik.bind_geodesic";
 }
 
-// Bindings take turns, whichever the method: two geodesic runs would share the library's stage timers,
-// and every run initialises GLEW's process-wide entry points when it makes its context. Each run already
-// uses every core through OpenMP, so little is lost.
+// Bindings take turns, whichever the method: two geodesic runs would share the library's stage timers.
+// Each run already uses every core through OpenMP, so little is lost.
 std::mutex& bindingMutex() {
   static std::mutex mutex;
   return mutex;
 }
+
+// Set while this thread binds: a progress callback that starts another binding would otherwise wait
+// for the lock its own thread holds, for ever.
+thread_local bool bindingOnThisThread = false;
 
 }  // namespace
 
@@ -310,15 +313,23 @@ py::tuple bind(py::handle vertices,
                          py::str(py::type::of(progress)).cast<std::string>());
   }
 
+  if (bindingOnThisThread)
+    throw std::runtime_error(std::string(functionName(options.method)) +
+                             " was called while this thread is already binding (from a progress callback?); "
+                             "bindings cannot nest");
   ProgressBridge bridge(std::move(progress));
   BindOutput out;
   {
     py::gil_scoped_release release;
     const std::lock_guard<std::mutex> lock(bindingMutex());
+    bindingOnThisThread = true;
+    struct Clear {
+      ~Clear() { bindingOnThisThread = false; }
+    } clear;
     out = run(in, options, bridge);
 #if defined(__GLIBC__)
-    // The heat-map octree alone is millions of small blocks (gigabytes even for a small mesh); glibc
-    // keeps freed blocks like these, so without this a long-lived interpreter would hold on to them.
+    // A binding frees many small blocks (topology, voxels, the factor); glibc keeps freed blocks like
+    // these, so without this a long-lived interpreter would hold on to them.
     malloc_trim(0);
 #endif
   }

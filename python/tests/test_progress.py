@@ -102,3 +102,18 @@ def test_ctrl_c_while_the_library_works_cancels_the_binding(gl):
     assert len(seen) == 1 and calls[seen[0] - 1].startswith("Computing Heatmap weights"), \
         "the helper ran while the library worked on the heat-map stage"
     assert len(calls) == seen[0], "the interrupt stopped the run before it reported again"
+
+
+def test_a_binding_started_from_a_progress_callback_raises_instead_of_waiting():
+    seen = []
+
+    def nested(stage, fraction):
+        if not seen:
+            seen.append(stage)
+            tessik.bind_heatmap(*rigs.arm())
+
+    with pytest.raises(RuntimeError, match="already binding"):
+        tessik.bind_heatmap(*rigs.arm(), progress=nested)
+    # The lock and the flag are released: the next binding runs.
+    _, weights = tessik.bind_heatmap(*rigs.arm())
+    assert weights.shape[0] == len(rigs.arm().vertices)
