@@ -206,6 +206,8 @@ TEST_F(ImportTest, BadInputsFailWithOneLineNamingTheFile) {
       const std::string what = e.what();
       EXPECT_NE(what.find(path), std::string::npos) << what;
       EXPECT_NE(what.find(text), std::string::npos) << what;
+      EXPECT_EQ(what.find('\n'), std::string::npos) << what;
+      EXPECT_LE(what.size(), path.size() + 240) << what;
     }
   }
 }

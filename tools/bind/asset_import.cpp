@@ -223,6 +223,14 @@ void importStatic(const aiScene* scene, ImportedAsset& asset) {
   for (bool u : used) asset.meshesSkipped += u ? 0 : 1;
 }
 
+// Importers may quote whole stretches of a broken file in their message; the user gets its first line,
+// and no more than `limit` characters of it.
+std::string oneLine(const std::string& text, std::size_t limit) {
+  std::string line = text.substr(0, text.find_first_of("\r\n"));
+  if (line.size() > limit) line = line.substr(0, limit - 3) + "...";
+  return line;
+}
+
 }  // namespace
 
 ImportedAsset importAsset(const std::string& path, bool ignoreFileSkeleton) {
@@ -240,7 +248,7 @@ ImportedAsset importAsset(const std::string& path, bool ignoreFileSkeleton) {
                          aiProcess_GenSmoothNormals | aiProcess_SortByPType;
   const aiScene* scene = importer.ReadFile(path, flags);
   if (scene == nullptr || scene->mRootNode == nullptr)
-    throw std::runtime_error("cannot import '" + path + "': " + importer.GetErrorString());
+    throw std::runtime_error("cannot import '" + path + "': " + oneLine(importer.GetErrorString(), 200));
 
   ImportedAsset asset;
   bool skinned = false;
