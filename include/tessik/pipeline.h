@@ -100,7 +100,10 @@ struct Weights {
 struct Report {
   std::size_t weldedVertices = 0;
   std::size_t pieces = 0;
-  std::size_t turnedPieces = 0;   ///< wound inside out, turned for binding
+  std::size_t turnedPieces = 0;  ///< wound inside out, turned for binding
+  /// Triangles of (next to) no area left out of the binding: they add nothing to the surface, and the
+  /// heat method cannot bind a surface holding one.
+  std::size_t droppedTriangles = 0;
   bool boundByPiece = false;      ///< the whole surface failed, so its pieces were bound in groups
   bool interiorOnGpu = false;     ///< the geodesic method voxelised the inside on the GPU
   std::size_t unboundPieces = 0;  ///< pieces no group binding reached

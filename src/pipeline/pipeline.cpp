@@ -251,6 +251,7 @@ Result bindSkin(const Mesh& mesh,
   std::vector<std::uint32_t> pieceOf;
   phase("Welding seams and orienting pieces", [&] {
     welded = weldByPosition(mesh, defaultWeldTolerance(mesh));
+    report.droppedTriangles = dropFlatTriangles(welded.mesh);
     report.turnedPieces = orientPiecesOutward(welded.mesh);
     report.pieces = labelPieces(welded.mesh, pieceOf);
   });

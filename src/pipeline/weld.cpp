@@ -107,6 +107,33 @@ WeldedMesh weldByPosition(const Mesh& mesh, float tolerance) {
   return out;
 }
 
+std::size_t dropFlatTriangles(Mesh& mesh) {
+  if (mesh.positions.empty()) return 0;
+  std::array<double, 3> lo, hi;
+  for (int c = 0; c < 3; ++c) lo[c] = hi[c] = mesh.positions[0][c];
+  for (const auto& p : mesh.positions)
+    for (int c = 0; c < 3; ++c) {
+      lo[c] = std::min(lo[c], double(p[c]));
+      hi[c] = std::max(hi[c], double(p[c]));
+    }
+  const double extent = std::max({hi[0] - lo[0], hi[1] - lo[1], hi[2] - lo[2]});
+  // Twice the heat method's own limit, so that rounding on its side of the unit frame cannot let one through.
+  const double limit = 2e-10 * extent * extent;
+  const std::size_t before = mesh.triangles.size();
+  auto flat = [&](const std::array<std::uint32_t, 3>& t) {
+    std::array<double, 3> u, w;
+    for (int c = 0; c < 3; ++c) {
+      u[c] = double(mesh.positions[t[1]][c]) - mesh.positions[t[0]][c];
+      w[c] = double(mesh.positions[t[2]][c]) - mesh.positions[t[0]][c];
+    }
+    const double x = u[1] * w[2] - u[2] * w[1], y = u[2] * w[0] - u[0] * w[2], z = u[0] * w[1] - u[1] * w[0];
+    return 0.5 * std::sqrt(x * x + y * y + z * z) < limit;
+  };
+  mesh.triangles.erase(std::remove_if(mesh.triangles.begin(), mesh.triangles.end(), flat),
+                       mesh.triangles.end());
+  return before - mesh.triangles.size();
+}
+
 std::size_t labelPieces(const Mesh& mesh, std::vector<std::uint32_t>& pieceOf) {
   std::vector<std::uint32_t> root(mesh.positions.size());
   std::iota(root.begin(), root.end(), 0u);

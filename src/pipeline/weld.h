@@ -17,6 +17,10 @@ struct WeldedMesh {
 // see each seam as a cut and could weight its two sides differently.
 WeldedMesh weldByPosition(const Mesh& mesh, float tolerance);
 
+// Removes the triangles whose area is below a ten-billionth of the square of the mesh's largest side:
+// the heat method refuses a surface holding one, and they add nothing to its shape. Answers how many went.
+std::size_t dropFlatTriangles(Mesh& mesh);
+
 // A tolerance relative to the mesh's size: small enough to keep distinct features apart, large enough to
 // absorb the rounding of the transforms that placed the vertices.
 float defaultWeldTolerance(const Mesh& mesh);

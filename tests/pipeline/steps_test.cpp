@@ -5,6 +5,7 @@
 
 #include "tessik/pipeline.h"
 
+#include "meshes/mesh_builders.h"
 #include "pipeline/bones.h"
 #include "pipeline/influences.h"
 
@@ -111,6 +112,34 @@ TEST(FoldAndLimit, TipsJoinTheirLeafBeforeTheCut) {
   EXPECT_EQ(second[0].bone, 0u) << "ties go to the lower bone, whatever order the method listed them in";
   EXPECT_DOUBLE_EQ(second[0].weight, 0.5);
   EXPECT_TRUE(row(out, 2).empty());
+}
+
+// One triangle of no area (three points on a line, one of them a vertex of its own) made the heat method
+// refuse the whole surface. It is left out, and the rest binds as it would without it.
+TEST(FlatTriangles, AreLeftOutAndTheRestBindsAsWithoutThem) {
+  const tessik::meshes::TriMesh tube = tessik::meshes::cylinderX(0.0f, 2.0f, 0.0f, 0.0f, 0.3f, 12, 12);
+  Mesh clean{tube.positions, tube.triangles};
+  Mesh spoiled = clean;
+  const auto& a = spoiled.positions[0];
+  const auto& b = spoiled.positions[12];  // the next ring, same angle: the edge runs along x
+  spoiled.positions.push_back({(a[0] + b[0]) / 2, (a[1] + b[1]) / 2, (a[2] + b[2]) / 2});
+  spoiled.triangles.push_back({0, 12, static_cast<std::uint32_t>(spoiled.positions.size() - 1)});
+  Options options;
+  options.method = Method::heatmap;  // needs no OpenGL, like this suite
+  const std::vector<Bone> bones = {boneAt("a", -1, 0.3), boneAt("b", 0, 1.0), boneAt("c", 1, 1.7)};
+  const Result expected = bindSkin(clean, bones, options);
+  const Result got = bindSkin(spoiled, bones, options);
+  EXPECT_EQ(got.report.droppedTriangles, 1u);
+  EXPECT_EQ(expected.report.droppedTriangles, 0u);
+  for (std::size_t v = 0; v < clean.positions.size(); ++v) {
+    const auto want = row(expected.weights, v), have = row(got.weights, v);
+    ASSERT_EQ(have.size(), want.size()) << v;
+    for (std::size_t k = 0; k < want.size(); ++k) {
+      EXPECT_EQ(have[k].bone, want[k].bone) << v;
+      EXPECT_NEAR(have[k].weight, want[k].weight, 1e-9) << v;
+    }
+  }
+  EXPECT_FALSE(row(got.weights, clean.positions.size()).empty()) << "the line's own vertex still gets a row";
 }
 
 TEST(Orphans, TakeTheNearestJointWholly) {

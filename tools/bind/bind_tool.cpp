@@ -222,7 +222,11 @@ void printSummary(const BoundRun& run, std::ostream& out) {
               ? " (" + std::to_string(r.turnedPieces) + " wound inside out, turned for binding)"
               : std::string())
       << "\n"
-      << "  triangles   " << mesh.triangles.size() << "\n"
+      << "  triangles   " << mesh.triangles.size()
+      << (r.droppedTriangles > 0
+              ? " (" + std::to_string(r.droppedTriangles) + " of no area left out of the binding)"
+              : std::string())
+      << "\n"
       << "  bones       " << run.asset.skeleton.joints.size() << "\n"
       << "  method      " << methodName(o.settings.method);
   if (o.settings.method == BindMethod::geodesic)
