@@ -1,9 +1,12 @@
 #include "pipeline/input_check.h"
 
+#include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdint>
 #include <limits>
 #include <map>
+#include <sstream>
 
 namespace TessikSDK::Pipeline {
 namespace {
@@ -44,6 +47,38 @@ std::string checkMesh(const Mesh& mesh) {
   for (const auto& p : mesh.positions)
     if (p != mesh.positions.front()) return {};
   return "all vertices lie at one point: the mesh has no extent to bind";
+}
+
+std::string checkSkeletonMeetsMesh(const Mesh& mesh, const std::vector<Bone>& bones) {
+  std::array<double, 3> lo{}, hi{}, jointLo{}, jointHi{};
+  for (int c = 0; c < 3; ++c) lo[c] = hi[c] = mesh.positions[0][c];
+  for (const auto& p : mesh.positions)
+    for (int c = 0; c < 3; ++c) {
+      lo[c] = std::min(lo[c], double(p[c]));
+      hi[c] = std::max(hi[c], double(p[c]));
+    }
+  const double margin =
+      0.1 * std::sqrt((hi[0] - lo[0]) * (hi[0] - lo[0]) + (hi[1] - lo[1]) * (hi[1] - lo[1]) +
+                      (hi[2] - lo[2]) * (hi[2] - lo[2]));
+  for (std::size_t b = 0; b < bones.size(); ++b) {
+    const std::array<double, 3> joint = {bones[b].bindPose[3], bones[b].bindPose[7], bones[b].bindPose[11]};
+    bool inside = true;
+    for (int c = 0; c < 3; ++c) {
+      inside = inside && joint[c] >= lo[c] - margin && joint[c] <= hi[c] + margin;
+      jointLo[c] = b == 0 ? joint[c] : std::min(jointLo[c], joint[c]);
+      jointHi[c] = b == 0 ? joint[c] : std::max(jointHi[c], joint[c]);
+    }
+    if (inside) return {};
+  }
+  auto box = [](const std::array<double, 3>& a, const std::array<double, 3>& z) {
+    std::ostringstream text;
+    text.precision(4);
+    text << "(" << a[0] << ", " << a[1] << ", " << a[2] << ") to (" << z[0] << ", " << z[1] << ", " << z[2]
+         << ")";
+    return text.str();
+  };
+  return "no joint lies within the mesh: its vertices span " + box(lo, hi) + ", the joints " +
+         box(jointLo, jointHi) + "; are the skeleton and the mesh in the same space and units?";
 }
 
 std::string checkBones(const std::vector<Bone>& bones) {

@@ -226,6 +226,8 @@ Result bindSkin(const Mesh& mesh,
                 gb::IProgress* progress) {
   for (const std::string& fault : {validateOptions(options), checkMesh(mesh), checkBones(bones)})
     if (!fault.empty()) throw BindError(BindError::Kind::invalidInput, fault);
+  if (const std::string fault = checkSkeletonMeetsMesh(mesh, bones); !fault.empty())
+    throw BindError(BindError::Kind::invalidInput, fault);
 
   // The library's console output belongs to the host's terminal or log, not to every call.
   struct ConsoleReports {

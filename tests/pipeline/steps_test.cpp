@@ -49,6 +49,11 @@ INSTANTIATE_TEST_SUITE_P(
         BadInput{"NotFinite", [](Mesh& m, auto&, auto&) { m.positions[1][1] = kNaN; }, "vertex 1"},
         BadInput{"TooFar", [](Mesh& m, auto&, auto&) { m.positions[2][0] = 1e30f; },
                  "vertex 2 has a coordinate of"},
+        BadInput{"SkeletonElsewhere",
+                 [](auto&, std::vector<Bone>& b, auto&) {
+                   for (Bone& bone : b) bone.bindPose[3] += 100.0;
+                 },
+                 "no joint lies within the mesh"},
         BadInput{"OnePoint",
                  [](Mesh& m, auto&, auto&) {
                    m.positions.assign(3, {1, 1, 1});

@@ -176,7 +176,8 @@ INSTANTIATE_TEST_SUITE_P(
                "would overwrite the skeleton"},
         BadRun{{"box.obj", "--skeleton", "bones.json", "-o", "new.glb", "--csv", "new.glb"}, "both name"},
         BadRun{{"box.obj", "--skeleton", "bones.json", "-o", "out.glb", "--csv", "out.glb"}, "both name"},
-        BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "/dev/null"}, "is not a regular file"}));
+        BadRun{{"box.obj", "--skeleton", "bones.json", "--csv", "/dev/null"}, "is not a regular file"},
+        BadRun{{"box.obj", "--skeleton", "outside.json", "-o", "out.glb"}, "no joint lies within the mesh"}));
 
 // Bad options are usage errors: status 2 and one line naming the option, whichever check catches them.
 TEST_F(CliTest, BadOptionsExitTwoWithOneLine) {
