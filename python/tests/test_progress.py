@@ -69,10 +69,14 @@ def test_ctrl_c_while_the_library_works_cancels_the_binding(gl):
     main = threading.main_thread().ident
     started = threading.Event()
     calls, seen = [], []
+    # Dense enough (about 40k vertices) that the heat stage lasts far longer than the helper needs to
+    # react, however fast the binding gets.
+    vertices, triangles = rigs.cylinder_x(0.0, 2.0, 0.2, 600, 64)
+    dense_arm = rigs.arm()._replace(vertices=vertices, triangles=triangles)
 
     def progress(stage, fraction):
         calls.append(stage)
-        # The pipeline's own steps before it are over in a moment; the method's stage takes seconds.
+        # The pipeline's own steps before it are over in a moment; the method's stage takes longer.
         if stage.startswith("Computing Heatmap weights"):
             started.set()
 
@@ -93,7 +97,7 @@ def test_ctrl_c_while_the_library_works_cancels_the_binding(gl):
         helper.start()
         try:
             with pytest.raises(Interrupted):
-                result = tessik.bind_heatmap(*rigs.arm(), progress=progress)
+                result = tessik.bind_heatmap(*dense_arm, progress=progress)
         finally:
             helper.join()
     finally:
