@@ -13,19 +13,6 @@ namespace {
 
 constexpr std::uint32_t kLeafTriangles = 4;
 
-// The same question as intersects(box, triangle), with the box-axis part asked first and with the same
-// arithmetic: most cells miss a triangle on an axis, and the full test is the conjunction of its axes.
-bool touches(const AABB& box, const Triangle& triangle) {
-  const glm::dvec3 centre = (box.lower + box.upper) * 0.5;
-  const glm::dvec3 half = (box.upper - box.lower) * 0.5;
-  for (int k = 0; k < 3; ++k) {
-    const double q0 = triangle.a[k] - centre[k], q1 = triangle.b[k] - centre[k],
-                 q2 = triangle.c[k] - centre[k];
-    if (std::min({q0, q1, q2}) > half[k] || std::max({q0, q1, q2}) < -half[k]) return false;
-  }
-  return triangleBoxOverlap(centre, half, triangle);
-}
-
 // Child `i` of an octant, computed as the octree splits: the shared centre value, then the flat-axis pad.
 AABB childCell(const AABB& cell, const glm::dvec3& centre, int i) {
   AABB child;
@@ -127,7 +114,7 @@ bool OcclusionIndex::sharesLeaf(const AABB& cell,
   const glm::dvec3 centre = (cell.lower + cell.upper) * 0.5;
   for (int i = 0; i < 8; ++i) {
     const AABB child = childCell(cell, centre, i);
-    if (!touches(child, triangle) || !intersects(child, segment)) continue;
+    if (!intersects(child, triangle) || !intersects(child, segment)) continue;
     if (sharesLeaf(child, depth + 1, segment, triangle)) return true;
   }
   return false;

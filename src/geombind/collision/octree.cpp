@@ -13,19 +13,7 @@ namespace {
 
 bool touches(const AABB& box, const glm::dvec3& point) { return contains(box, point); }
 bool touches(const AABB& box, const Segment& segment) { return intersects(box, segment); }
-bool touches(const AABB& box, const Triangle& triangle) {
-  // Most children of a split miss a given triangle on a box axis. That axis test, done first with exactly
-  // the arithmetic of the full overlap test, rejects them cheaply; the answer cannot differ, since the
-  // full test is the conjunction of its axis tests.
-  const glm::dvec3 centre = (box.lower + box.upper) * 0.5;
-  const glm::dvec3 half = (box.upper - box.lower) * 0.5;
-  for (int k = 0; k < 3; ++k) {
-    const double q0 = triangle.a[k] - centre[k], q1 = triangle.b[k] - centre[k],
-                 q2 = triangle.c[k] - centre[k];
-    if (std::min({q0, q1, q2}) > half[k] || std::max({q0, q1, q2}) < -half[k]) return false;
-  }
-  return triangleBoxOverlap(centre, half, triangle);
-}
+bool touches(const AABB& box, const Triangle& triangle) { return intersects(box, triangle); }
 
 }  // namespace
 
